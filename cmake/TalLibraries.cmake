@@ -1,0 +1,32 @@
+# The libraries that the project stands on, each as one imported target.
+# A library that one back-end alone needs is optional: without it that back-end
+# is left out, and the summary at the end of the configure run says so.
+find_package(PkgConfig REQUIRED)
+find_package(Threads REQUIRED)
+
+pkg_check_modules(SQLITE REQUIRED IMPORTED_TARGET sqlite3)
+pkg_check_modules(CBOR REQUIRED IMPORTED_TARGET libcbor)
+pkg_check_modules(TOMLPLUSPLUS REQUIRED IMPORTED_TARGET tomlplusplus)
+pkg_check_modules(SYSTEMD IMPORTED_TARGET libsystemd)
+pkg_check_modules(PIPEWIRE IMPORTED_TARGET libpipewire-0.3)
+find_package(CLI11 REQUIRED)
+find_package(nlohmann_json REQUIRED)
+
+find_path(ASIO_INCLUDE_DIR asio.hpp REQUIRED)
+add_library(tal_asio INTERFACE)
+target_include_directories(tal_asio SYSTEM INTERFACE "${ASIO_INCLUDE_DIR}")
+# asio asks a macro of the standard library for aligned_alloc, perhaps before any header has defined it: left to itself
+# it allocates in one source file with malloc and frees in another with delete.
+target_compile_definitions(tal_asio INTERFACE ASIO_STANDALONE ASIO_NO_DEPRECATED ASIO_HAS_STD_ALIGNED_ALLOC=1)
+if(TAL_SANITIZE MATCHES "thread")
+  # Its fences, which the thread sanitizer cannot follow, add nothing to the locks and queues that hand work over here.
+  target_compile_definitions(tal_asio INTERFACE ASIO_DISABLE_FENCED_BLOCK)
+endif()
+target_link_libraries(tal_asio INTERFACE Threads::Threads)
+
+if(NOT SYSTEMD_FOUND)
+  message(STATUS "libsystemd not found: no journal, no readiness notification, no socket activation")
+endif()
+if(NOT PIPEWIRE_FOUND)
+  message(STATUS "libpipewire-0.3 not found: tal-pipewire-reporter is left out")
+endif()
