@@ -1,0 +1,44 @@
+#pragma once
+
+#include "core/Log.h"
+#include "platform/AnalyticsSink.h"
+#include "platform/Clock.h"
+#include "platform/DeviceProperties.h"
+#include "platform/DiagnosticLog.h"
+#include "platform/NotifyCenter.h"
+#include "platform/ProcessTable.h"
+#include "platform/SerialQueue.h"
+#include "platform/SettingsStore.h"
+#include "platform/SystemState.h"
+#include "platform/TracePoints.h"
+
+namespace tal {
+
+/// Everything that the system needs of its host, made by `main` and handed down.
+/// The bundle owns nothing; what it refers to outlives all who hold it.
+struct Platform {
+  SerialQueue& reporting_queue;
+  const Clock& clock;
+  const LogChannels& log;
+  TracePoints& trace_points;
+  const DeviceProperties& device_properties;
+  SettingsStore& settings;
+  NotifyCenter& notify_center;
+  const ProcessTable& processes;
+  AnalyticsSink& analytics;
+  const SystemState& system_state;
+  DiagnosticLog& diagnostic_log;
+  /// `TalReportingUtilityIsInternalBuild`, asked once.
+  bool internal_build = false;
+};
+
+/// The label that the host's tools show for the reporting queue's thread.
+inline constexpr std::string_view kReportingServerQueueLabel = "org.vantle.talsys.reporting.server";
+
+/// The reporting queue: the one serial queue on which all operations of the
+/// service, its sessions and their workers run.
+inline SerialQueue& TalReportingUtilityGetReportingServerQueue(const Platform& platform) {
+  return platform.reporting_queue;
+}
+
+}  // namespace tal
