@@ -1,0 +1,59 @@
+#include "service/WorkerRosterTable.h"
+
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "session/DecliningWorkerClass.h"
+#include "system/TalReportingSessionSystemMonitorWorker.h"
+#include "workers/derived/TalReportingSessionHuddleMessagesWorker.h"
+#include "workers/derived/TalReportingSessionInputMessagesWorker.h"
+#include "workers/derived/TalReportingSessionVolumeMessagesWorker.h"
+#include "workers/sinks/TalReportingSessionSummaryJsonFileWorker.h"
+#include "workers/sinks/TalReportingSessionSummaryWorker.h"
+#include "workers/sinks/TalReportingSessionTallyWorker.h"
+
+namespace tal {
+
+namespace {
+
+using Traits = TalReportingSessionWorkerClass::Traits;
+
+constexpr Traits kNeither{};
+constexpr Traits kProducer{.is_producer = true};
+constexpr Traits kConsumer{.is_consumer = true};
+constexpr Traits kConsumerFromInit{.is_consumer = true, .start_on_init = true};
+constexpr Traits kSingleMessageConsumer{.is_consumer = true, .handle_single_message_session = true};
+constexpr Traits kSingleMessageConsumerFromInit{
+    .is_consumer = true, .start_on_init = true, .handle_single_message_session = true};
+
+std::unique_ptr<TalReportingSessionWorkerClass> declining(std::string_view name, Traits traits) {
+  return std::make_unique<DecliningWorkerClass>(name, traits);
+}
+
+}  // namespace
+
+std::unique_ptr<WorkerRoster> makeWorkerRoster(const Platform& platform,
+                                               const TalReportingSystemMonitor& system_monitor) {
+  std::vector<std::unique_ptr<TalReportingSessionWorkerClass>> classes;
+  classes.push_back(declining("TalReportingSessionTraceWorker", kNeither));
+  classes.push_back(std::make_unique<TalReportingSessionVolumeMessagesWorkerClass>());
+  classes.push_back(std::make_unique<TalReportingSessionHuddleMessagesWorkerClass>());
+  classes.push_back(std::make_unique<TalReportingSessionSummaryWorkerClass>());
+  classes.push_back(std::make_unique<TalReportingSessionInputMessagesWorkerClass>());
+  classes.push_back(std::make_unique<TalReportingSessionTallyWorkerClass>(platform.analytics));
+  classes.push_back(declining("TalReportingSessionEnergylogWorker", kSingleMessageConsumerFromInit));
+  classes.push_back(declining("TalReportingSessionMemoryLogWorker", kConsumerFromInit));
+  classes.push_back(declining("TalReportingSessionPlumeWorker", kSingleMessageConsumerFromInit));
+  classes.push_back(declining("TalReportingSessionDriverSnapshotWorker", kProducer));
+  classes.push_back(std::make_unique<TalReportingSessionSystemMonitorWorkerClass>(system_monitor));
+  classes.push_back(declining("TalReportingSessionHoundWorker", kSingleMessageConsumer));
+  classes.push_back(declining("TalReportingSessionDPWorker", kConsumer));
+  classes.push_back(std::make_unique<TalReportingSessionSummaryJsonFileWorkerClass>());
+  classes.push_back(declining("TalReportingSessionAudioRegistrationWorker", kConsumer));
+  classes.push_back(declining("TalReportingSessionRtcWorker", kSingleMessageConsumer));
+  classes.push_back(declining("TalReportingSessionTapToKiteWorker", kSingleMessageConsumer));
+  return std::make_unique<WorkerRoster>(std::move(classes), platform.log.session);
+}
+
+}  // namespace tal
