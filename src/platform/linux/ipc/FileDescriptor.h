@@ -1,0 +1,31 @@
+#pragma once
+
+#include <unistd.h>
+
+#include <utility>
+
+namespace tal {
+
+/// Owns a file descriptor.
+class FileDescriptor {
+ public:
+  FileDescriptor() = default;
+  explicit FileDescriptor(int number) : number_(number) {}
+  FileDescriptor(FileDescriptor&& other) noexcept : number_(other.release()) {}
+  FileDescriptor& operator=(FileDescriptor&& other) noexcept {
+    std::swap(number_, other.number_);
+    return *this;
+  }
+  ~FileDescriptor() {
+    if (number_ >= 0) ::close(number_);
+  }
+
+  int get() const { return number_; }
+  explicit operator bool() const { return number_ >= 0; }
+  int release() { return std::exchange(number_, -1); }
+
+ private:
+  int number_ = -1;
+};
+
+}  // namespace tal

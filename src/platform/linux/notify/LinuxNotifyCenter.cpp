@@ -1,0 +1,123 @@
+#include "platform/linux/notify/LinuxNotifyCenter.h"
+
+#include <pthread.h>
+
+#include <atomic>
+#include <system_error>
+#include <utility>
+
+#include "platform/linux/notify/NotifyFiles.h"
+
+namespace tal {
+
+struct LinuxNotifyCenter::Watcher {
+  const std::string name;
+  const Token token;
+  SerialQueue& queue;
+  const Handler handler;
+  /// Posts that the handler has not been called for yet. While there are any,
+  /// one task for this watcher waits on the queue.
+  std::atomic<std::uint64_t> untold{0};
+};
+
+LinuxNotifyCenter::LinuxNotifyCenter(const std::filesystem::path& runtime_directory, const LogChannel& log)
+    : log_(log), directory_(runtime_directory / kNotifyFolder, log) {
+  if (!directory_.canWatch()) return;
+  thread_ = std::thread([this] {
+    pthread_setname_np(pthread_self(), "notify");
+    run();
+  });
+}
+
+LinuxNotifyCenter::~LinuxNotifyCenter() {
+  if (!thread_.joinable()) return;
+  directory_.end();
+  thread_.join();
+}
+
+NotifyCenter::Registration LinuxNotifyCenter::registerDispatch(std::string_view name, SerialQueue& queue,
+                                                               Handler handler) {
+  if (!isNotificationName(name)) return {NotifyStatus::kInvalidName, kNoToken};
+  if (!directory_.canWatch()) return {NotifyStatus::kFailed, kNoToken};
+  const std::lock_guard lock(mutex_);
+  const Token token = ++last_token_;
+  watchers_[token] =
+      std::shared_ptr<Watcher>(new Watcher{std::string(name), token, queue, std::move(handler)});
+  return {NotifyStatus::kOk, token};
+}
+
+NotifyCenter::State LinuxNotifyCenter::getState(Token token) {
+  std::shared_ptr<Watcher> watcher;
+  {
+    const std::lock_guard lock(mutex_);
+    const auto found = watchers_.find(token);
+    if (found == watchers_.end()) return {NotifyStatus::kInvalidToken, 0};
+    watcher = found->second;
+  }
+  const auto state = readNotificationState(directory_.path(), watcher->name);
+  if (const auto* error = std::get_if<NotifyError>(&state)) {
+    TAL_LOG_ERROR(log_, "the state of notification ", watcher->name, " was not read: ", error->reason);
+    return {NotifyStatus::kFailed, 0};
+  }
+  return {NotifyStatus::kOk, std::get<std::uint64_t>(state)};
+}
+
+NotifyStatus LinuxNotifyCenter::cancel(Token token) {
+  std::shared_ptr<Watcher> gone;  // its handler is destroyed with no lock held
+  const std::lock_guard lock(mutex_);
+  const auto found = watchers_.find(token);
+  if (found == watchers_.end()) return NotifyStatus::kInvalidToken;
+  gone = std::move(found->second);
+  watchers_.erase(found);
+  return NotifyStatus::kOk;
+}
+
+NotifyStatus LinuxNotifyCenter::post(std::string_view name, std::optional<std::uint64_t> state) {
+  if (!isNotificationName(name)) return NotifyStatus::kInvalidName;
+  const auto error = postNotification(directory_.path(), name, state);
+  if (!error) return NotifyStatus::kOk;
+  TAL_LOG_ERROR(log_, "notification ", name, " was not posted: ", error->reason);
+  return NotifyStatus::kFailed;
+}
+
+void LinuxNotifyCenter::run() {
+  while (true) {
+    const NotifyDirectory::Changes changes = directory_.wait();
+    if (changes.ended) return;
+    tell(changes);
+  }
+}
+
+// Under the lock throughout, so that a cancelled watcher's queue is left alone.
+void LinuxNotifyCenter::tell(const NotifyDirectory::Changes& changes) {
+  const std::lock_guard lock(mutex_);
+  for (const std::string& name : changes.posted) {
+    for (const auto& [token, watcher] : watchers_) {
+      if (watcher->name == name) tellOnce(watcher);
+    }
+  }
+  if (!changes.some_missed) return;
+  for (const auto& [token, watcher] : watchers_) {
+    std::error_code ignored;
+    const auto file = std::filesystem::symlink_status(directory_.path() / watcher->name, ignored);
+    // Without a file nobody has posted, and nothing can have been missed.
+    if (std::filesystem::exists(file)) tellOnce(watcher);
+  }
+}
+
+void LinuxNotifyCenter::tellOnce(const std::shared_ptr<Watcher>& watcher) {
+  if (watcher->untold.fetch_add(1) == 0) postDelivery(watcher);
+}
+
+// One call a task, so that a burst does not keep the queue's other work waiting.
+void LinuxNotifyCenter::postDelivery(const std::shared_ptr<Watcher>& watcher) {
+  watcher->queue.post([weak = std::weak_ptr<Watcher>(watcher)] {
+    const std::shared_ptr<Watcher> held = weak.lock();
+    if (!held) return;  // cancelled
+    const bool more = held->untold.fetch_sub(1) > 1;
+    held->handler(held->token);
+    if (more) postDelivery(held);
+  });
+}
+
+}  // namespace tal

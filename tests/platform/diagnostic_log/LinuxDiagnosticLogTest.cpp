@@ -1,0 +1,91 @@
+#include <gtest/gtest.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+
+#include <csignal>
+#include <filesystem>
+#include <string>
+
+#include "platform/TemporaryDirectory.h"
+#include "platform/linux/diagnostic_log/LinuxDiagnosticLog.h"
+
+namespace tal {
+namespace {
+
+namespace fs = std::filesystem;
+
+class DiagnosticLogOnDisk : public ::testing::Test {
+ protected:
+  test::TemporaryDirectory root;
+  LinuxDiagnosticLog log{root.path()};
+};
+
+TEST_F(DiagnosticLogOnDisk, PlacesAreOpenToEveryoneWhateverTheMask) {
+  const mode_t before = ::umask(0077);
+  EXPECT_EQ(log.makeDirectory("Audio/Reporting"), std::nullopt);
+  EXPECT_EQ(log.makeDirectory("Audio/Reporting"), std::nullopt) << "is there already";
+  ::umask(before);
+  for (const char* place : {"Audio", "Audio/Reporting"}) {
+    EXPECT_EQ(fs::status(root.path() / place).permissions(), fs::perms::all) << place;
+  }
+  test::writeFile(root.path() / "file", "");
+  EXPECT_NE(log.makeDirectory("file/below"), std::nullopt);
+}
+
+TEST_F(DiagnosticLogOnDisk, FilesAreWrittenWhole) {
+  ASSERT_EQ(log.makeDirectory("Audio"), std::nullopt);
+  auto opened = log.createFile("Audio", "report.json");
+  ASSERT_TRUE(opened.file) << opened.error;
+  std::string expected;
+  for (const std::size_t size : {1U, 300'000U, 200'000U, 100'000U, 7U}) {
+    const std::string piece(size, static_cast<char>('a' + size % 26));
+    EXPECT_EQ(opened.file->write(piece), std::nullopt);
+    expected += piece;
+  }
+  EXPECT_EQ(opened.file->close(), std::nullopt);
+  EXPECT_EQ(test::readFile(root.path() / "Audio/report.json"), expected);
+  EXPECT_EQ(log.pathOf("Audio"), (root.path() / "Audio").string());
+}
+
+TEST_F(DiagnosticLogOnDisk, NothingThatExistsIsOpenedAndNoLinkFollowed) {
+  ASSERT_EQ(log.makeDirectory("Audio"), std::nullopt);
+  const fs::path precious = root.path() / "precious";
+  test::writeFile(precious, "keep");
+  test::writeFile(root.path() / "Audio/taken", "keep");
+  fs::create_symlink(precious, root.path() / "Audio/link");
+  fs::create_symlink(root.path() / "elsewhere", root.path() / "Audio/dangling");
+  fs::create_directory_symlink(root.path(), root.path() / "Audio/away");
+  for (const char* name : {"taken", "link", "dangling"}) {
+    EXPECT_FALSE(log.createFile("Audio", name).file) << name;
+  }
+  EXPECT_FALSE(log.createFile("Audio/away", "new").file);
+  EXPECT_NE(log.makeDirectory("Audio/away/below"), std::nullopt);
+  EXPECT_FALSE(fs::exists(root.path() / "elsewhere") || fs::exists(root.path() / "new"));
+  EXPECT_EQ(test::readFile(precious), "keep");
+}
+
+TEST_F(DiagnosticLogOnDisk, MissingLogIsAnErrorAndNoMore) {
+  LinuxDiagnosticLog missing(root.path() / "gone");
+  EXPECT_NE(missing.makeDirectory("Audio"), std::nullopt);
+  EXPECT_FALSE(missing.createFile("Audio", "report.json").error.empty());
+}
+
+// A limit on the size of files stands in for a full disk.
+TEST_F(DiagnosticLogOnDisk, DiskThatIsFullIsToldOf) {
+  ASSERT_EQ(log.makeDirectory("Audio"), std::nullopt);
+  auto opened = log.createFile("Audio", "report.json");
+  ASSERT_TRUE(opened.file);
+  EXPECT_EQ(opened.file->write("small enough to wait in memory"), std::nullopt);
+  rlimit before{};
+  getrlimit(RLIMIT_FSIZE, &before);
+  const rlimit tiny{.rlim_cur = 8, .rlim_max = before.rlim_max};
+  const auto handler = std::signal(SIGXFSZ, SIG_IGN);
+  setrlimit(RLIMIT_FSIZE, &tiny);
+  const DiagnosticFile::Error error = opened.file->close();
+  setrlimit(RLIMIT_FSIZE, &before);
+  std::signal(SIGXFSZ, handler);
+  EXPECT_EQ(error, "File too large");
+}
+
+}  // namespace
+}  // namespace tal
