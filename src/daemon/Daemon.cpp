@@ -1,0 +1,138 @@
+#include "daemon/Daemon.h"
+
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <cstdlib>
+#include <future>
+#include <utility>
+
+#include "platform/linux/ipc/IpcSettings.h"
+#include "platform/linux/ipc/ServiceManager.h"
+#include "platform/linux/logging/JournalLogSink.h"
+#include "platform/linux/process/StartupError.h"
+#include "service/WorkerRosterTable.h"
+
+namespace tal {
+
+namespace {
+
+constexpr int kExitKilled = 2;
+// Files are the daemon's user's and group's.
+constexpr mode_t kFileMask = 0027;
+// Descriptors that are not clients: the store, logs, event queues.
+constexpr rlim_t kOwnDescriptors = 64;
+
+std::optional<std::string> fromEnvironment(const char* name) {
+  const char* value = std::getenv(name);
+  return value && *value != '\0' ? std::optional<std::string>(value) : std::nullopt;
+}
+
+Directories preparedDirectories(const DaemonOptions& options) {
+  ::umask(kFileMask);
+  Directories directories = chooseDirectories(options.directories, ::geteuid() == 0, fromEnvironment);
+  makeDirectories(directories);
+  return directories;
+}
+
+std::unique_ptr<LogSink> makeLogSink(DaemonOptions::LogTo log_to) {
+  if (log_to == DaemonOptions::LogTo::kStderr) return std::make_unique<StderrLogSink>();
+  auto journal = makeJournalLogSink();
+  if (!journal) throw StartupError("built without the system journal: use --log-to stderr");
+  return journal;
+}
+
+// As many files as clients may connect, as far as the hard limit goes.
+void raiseDescriptorLimit(std::size_t connections) {
+  rlimit limit{};
+  if (::getrlimit(RLIMIT_NOFILE, &limit) != 0) return;
+  const rlim_t wanted = connections + kOwnDescriptors;
+  if (limit.rlim_cur >= wanted) return;
+  limit.rlim_cur = std::min(wanted, limit.rlim_max);
+  ::setrlimit(RLIMIT_NOFILE, &limit);
+}
+
+}  // namespace
+
+Daemon::Daemon(const DaemonOptions& options, const std::string& version)
+    : directories_(preparedDirectories(options)),
+      lock_(directories_.state),
+      log_sink_(makeLogSink(options.log_to)),
+      log_(log_sink_.get(), options.log_level),
+      device_properties_(directories_.config, log_.service),
+      settings_({.config_directory = directories_.config,
+                 .state_directory = directories_.state,
+                 .clock = clock_,
+                 .log = log_.service}),
+      store_({.directory = directories_.state, .settings = settings_, .clock = clock_, .log = log_.service}),
+      analytics_({.store = store_,
+                  .clock = clock_,
+                  .wanted = {.settings = settings_, .log = log_.service, .coarse_now = LinuxClock::coarse}}),
+      durability_gate_(store_),
+      notify_center_(directories_.runtime, log_.service),
+      system_state_(clock_),
+      diagnostic_log_(directories_.log),
+      queue_(kReportingServerQueueLabel),
+      platform_{.reporting_queue = queue_,
+                .clock = clock_,
+                .log = log_,
+                .trace_points = trace_points_,
+                .device_properties = device_properties_,
+                .settings = settings_,
+                .notify_center = notify_center_,
+                .processes = processes_,
+                .analytics = analytics_,
+                .system_state = system_state_,
+                .diagnostic_log = diagnostic_log_,
+                .internal_build = TalReportingUtilityIsInternalBuild(device_properties_)},
+      system_monitor_(platform_),
+      roster_(makeWorkerRoster(platform_, system_monitor_)),
+      service_(platform_, *roster_, system_monitor_, serviceOptions()),
+      listener_(service_, durability_gate_, listeningSocket(), "talreportingd " + version),
+      signals_(signal_context_, SIGTERM, SIGINT) {
+  // A client or a log reader that goes away is an error of one write, no more.
+  std::signal(SIGPIPE, SIG_IGN);
+  raiseDescriptorLimit(readIpcSettings(settings_).max_connections);
+}
+
+ListeningSocket Daemon::listeningSocket() const {
+  if (auto inherited = takeInheritedSocket()) return ListeningSocket(std::move(*inherited));
+  return ListeningSocket(directories_.socket());
+}
+
+TalReportingService::Options Daemon::serviceOptions() {
+  return {.end_process = [this] { endProcess(); },
+          .max_kept_bytes = readIpcSettings(settings_).max_kept_bytes};
+}
+
+// On the I/O thread, while others run on: no destructor may run.
+void Daemon::endProcess() {
+  store_.flushAndClose();
+  ::_exit(kExitKilled);
+}
+
+void Daemon::run() {
+  signals_.async_wait([](const asio::error_code&, int) {});
+  listener_.start();
+  tellServiceManagerReady();
+  signal_context_.run();
+  tellServiceManagerStopping();
+  endInOrder();
+}
+
+void Daemon::endInOrder() {
+  listener_.drain();
+  std::promise<void> stopped;
+  queue_.post([this, &stopped] {
+    service_.stopAllSessions();
+    stopped.set_value();
+  });
+  stopped.get_future().wait();
+  store_.flushAndClose();
+  listener_.stop();
+  queue_.stop();
+}
+
+}  // namespace tal

@@ -1,0 +1,81 @@
+#pragma once
+
+// The whole system, put together: every object that lives as long as the
+// process, in the order in which each needs those before it.
+
+#include <asio/io_context.hpp>
+#include <asio/signal_set.hpp>
+#include <memory>
+#include <string>
+
+#include "core/Log.h"
+#include "daemon/CommandLine.h"
+#include "daemon/Directories.h"
+#include "daemon/StoreDurabilityGate.h"
+#include "platform/Platform.h"
+#include "platform/linux/diagnostic_log/LinuxDiagnosticLog.h"
+#include "platform/linux/ipc/IpcListener.h"
+#include "platform/linux/logging/StderrLogSink.h"
+#include "platform/linux/notify/LinuxNotifyCenter.h"
+#include "platform/linux/process/InstanceLock.h"
+#include "platform/linux/process/LinuxClock.h"
+#include "platform/linux/process/LinuxProcessTable.h"
+#include "platform/linux/process/ReportingQueue.h"
+#include "platform/linux/process/SdtTracePoints.h"
+#include "platform/linux/settings/DeviceTomlProperties.h"
+#include "platform/linux/settings/TomlSettings.h"
+#include "platform/linux/store/StoreAnalyticsSink.h"
+#include "platform/linux/store/StoreWriter.h"
+#include "platform/linux/system_state/LinuxSystemState.h"
+#include "service/TalReportingService.h"
+#include "session/WorkerRoster.h"
+#include "system/TalReportingSystemMonitor.h"
+
+namespace tal {
+
+/// One per process; used by `main` alone.
+class Daemon {
+ public:
+  /// Makes everything; nobody is served yet. Throws StartupError.
+  Daemon(const DaemonOptions& options, const std::string& version);
+  Daemon(const Daemon&) = delete;
+  Daemon& operator=(const Daemon&) = delete;
+
+  /// Serves clients until SIGTERM or SIGINT, then ends in order: what was
+  /// received is carried out, sessions are stopped, the store is committed.
+  void run();
+
+ private:
+  ListeningSocket listeningSocket() const;
+  TalReportingService::Options serviceOptions();
+  [[noreturn]] void endProcess();
+  void endInOrder();
+
+  const Directories directories_;
+  const InstanceLock lock_;
+  const std::unique_ptr<LogSink> log_sink_;
+  const LogChannels log_;
+  LinuxClock clock_;
+  SdtTracePoints trace_points_;
+  LinuxProcessTable processes_;
+  DeviceTomlProperties device_properties_;
+  TomlSettings settings_;
+  StoreWriter store_;
+  StoreAnalyticsSink analytics_;
+  StoreDurabilityGate durability_gate_;
+  LinuxNotifyCenter notify_center_;
+  LinuxSystemState system_state_;
+  LinuxDiagnosticLog diagnostic_log_;
+  // Destroyed after the queue's thread, whose tasks use them, has ended.
+  ReportingQueue queue_;
+  const Platform platform_;
+  TalReportingSystemMonitor system_monitor_;
+  const std::unique_ptr<WorkerRoster> roster_;
+  TalReportingService service_;
+  IpcListener listener_;
+
+  asio::io_context signal_context_{1};
+  asio::signal_set signals_;
+};
+
+}  // namespace tal
