@@ -1,0 +1,255 @@
+// What the reporting queue's own work costs, in process: intake of a message,
+// memory of a kept one, stop of a long session, life of a short one.
+
+#include <benchmark/benchmark.h>
+#include <malloc.h>
+
+#include <array>
+#include <chrono>
+#include <memory>
+#include <unordered_map>
+#include <vector>
+
+#include "core/DictShape.h"
+#include "platform/Platform.h"
+#include "service/WorkerRosterTable.h"
+#include "session/TalReportingSession.h"
+#include "system/TalReportingSystemMonitor.h"
+
+namespace tal {
+namespace {
+
+class NoQueue final : public SerialQueue {
+ public:
+  void post(Task) override {}
+  void postAfter(std::chrono::nanoseconds, Task) override {}
+  bool isCurrent() const override { return true; }
+};
+
+class SystemClock final : public Clock {
+ public:
+  double secondsSince1970() const override {
+    return std::chrono::duration<double>(std::chrono::system_clock::now().time_since_epoch()).count();
+  }
+  Instant monotonic() const override { return std::chrono::steady_clock::now().time_since_epoch(); }
+  TimeReading read() const override { return {secondsSince1970(), 0, 0}; }
+  std::string localTimeForFileName() const override { return "20260131-144502+0000"; }
+};
+
+class NoTrace final : public TracePoints {
+ public:
+  void emit(TraceCode) override {}
+};
+
+class CustomerBuild final : public DeviceProperties {
+ public:
+  std::optional<bool> booleanProperty(std::string_view) const override { return false; }
+};
+
+class NoSettings final : public SettingsStore {
+ public:
+  std::optional<MessageValue> value(std::string_view, std::string_view) const override {
+    return std::nullopt;
+  }
+  void refresh(std::string_view) override {}
+  bool setValue(std::string_view, std::string_view, const MessageValue&) override { return false; }
+};
+
+class NoNotifications final : public NotifyCenter {
+ public:
+  Registration registerDispatch(std::string_view, SerialQueue&, Handler) override { return {}; }
+  State getState(Token) override { return {}; }
+  NotifyStatus cancel(Token) override { return NotifyStatus::kInvalidToken; }
+  NotifyStatus post(std::string_view, std::optional<std::uint64_t>) override { return NotifyStatus::kFailed; }
+};
+
+class NoProcesses final : public ProcessTable {
+ public:
+  std::optional<std::string> processName(std::int32_t) const override { return std::nullopt; }
+  std::int32_t ownProcessIdentifier() const override { return 1; }
+};
+
+/// Nobody consumes any event; one hash look-up per name, as on a device.
+class NothingWanted final : public AnalyticsSink {
+ public:
+  bool eventIsWanted(std::string_view name) override {
+    const auto found = known_.find(std::hash<std::string_view>{}(name));
+    if (found == known_.end()) known_.emplace(std::hash<std::string_view>{}(name), false);
+    return found != known_.end() && found->second;
+  }
+  void sendEventWithPayloadProvider(std::string_view, const PayloadProvider&) override {}
+
+ private:
+  std::unordered_map<std::size_t, bool> known_;
+};
+
+class CalmDevice final : public SystemState {
+ public:
+  int thermalState() const override { return 0; }
+  bool lowPowerModeIsOn() const override { return false; }
+  Footprint physicalFootprint() const override { return {.bytes = 0, .error = ""}; }
+  std::array<double, 3> loadAverages() const override { return {}; }
+};
+
+class NoDiagnosticLog final : public DiagnosticLog {
+ public:
+  std::string pathOf(std::string_view place) const override { return std::string(place); }
+  DiagnosticFile::Error makeDirectory(std::string_view) override { return std::nullopt; }
+  Opened createFile(std::string_view, std::string_view) override { return {nullptr, "none here"}; }
+};
+
+struct Host {
+  NoQueue queue;
+  SystemClock clock;
+  LogChannels log{nullptr};
+  NoTrace trace;
+  CustomerBuild device;
+  NoSettings settings;
+  NoNotifications notify_center;
+  NoProcesses processes;
+  NothingWanted analytics;
+  CalmDevice system_state;
+  NoDiagnosticLog diagnostic_log;
+  Platform platform{.reporting_queue = queue,
+                    .clock = clock,
+                    .log = log,
+                    .trace_points = trace,
+                    .device_properties = device,
+                    .settings = settings,
+                    .notify_center = notify_center,
+                    .processes = processes,
+                    .analytics = analytics,
+                    .system_state = system_state,
+                    .diagnostic_log = diagnostic_log};
+  TalReportingSystemMonitor system_monitor{platform};
+  std::unique_ptr<WorkerRoster> roster = makeWorkerRoster(platform, system_monitor);
+  std::size_t kept_bytes = 0;
+
+  Host() { system_monitor.initializeWithQueue(queue); }
+
+  std::unique_ptr<TalReportingSession> makeSession() {
+    return std::make_unique<TalReportingSession>(
+        TalReportingSession::Options{.reporter_id = 7, .process_identifiers = {1}}, platform, *roster,
+        kept_bytes);
+  }
+};
+
+/// Twelve keys that share one shape, as the decoder makes them from a client's
+/// messages; each differs from the one before.
+class MessageMaker {
+ public:
+  MessageDict make() {
+    ++number_;
+    const double now = 1.8e9 + static_cast<double>(number_) * 0.001;
+    MessageValue values[] = {number_ % 2 == 0, 0.4,   "Built-in Audio Stereo",
+                             "S16LE 44100 Hz", "raw", 2,
+                             number_,          now,   0.25,
+                             "overload",       256,   number_ * 3};
+    return {shape_, values};
+  }
+
+ private:
+  static constexpr MessageKey kKeys[] = {"session_output_running",
+                                         "RvSessionVolume",
+                                         "active_devices",
+                                         "session_selected_format",
+                                         "mFormatID",
+                                         "mChannelsPerFrame",
+                                         "stretch_index",
+                                         "talreporting_timestamp",
+                                         "session_duration",
+                                         "issue_type",
+                                         "smallest_buffer_frame_size",
+                                         "io_cycle"};
+  DictShape::Pointer shape_ = DictShape::make(kKeys);
+  std::int64_t number_ = 0;
+};
+
+void send(TalReportingSession& session, MessageMaker& maker) {
+  session.sendMessage(TalReportingSessionMessage::initWithMessage(maker.make(), AudioEventCategory::kPlayback,
+                                                                  AudioEventType::kGeneric));
+}
+
+void Intake(benchmark::State& state) {
+  Host host;
+  MessageMaker maker;
+  constexpr int kMessages = 10'000;
+  for (auto _ : state) {
+    state.PauseTiming();
+    auto session = host.makeSession();
+    session->setServiceType(AudioServiceType::kLongformaudio);
+    session->start();
+    std::vector<MessageDict> messages;
+    messages.reserve(kMessages);
+    for (int i = 0; i < kMessages; ++i) messages.push_back(maker.make());
+    state.ResumeTiming();
+    for (MessageDict& message : messages) {
+      session->sendMessage(TalReportingSessionMessage::initWithMessage(
+          std::move(message), AudioEventCategory::kPlayback, AudioEventType::kGeneric));
+    }
+    state.PauseTiming();
+    messages.clear();
+    session.reset();
+    state.ResumeTiming();
+  }
+  state.SetItemsProcessed(state.iterations() * kMessages);
+  // Seconds for a million messages are microseconds for one.
+  state.counters["per_million_messages"] =
+      benchmark::Counter(static_cast<double>(state.iterations()) * kMessages / 1e6,
+                         benchmark::Counter::kIsRate | benchmark::Counter::kInvert);
+}
+BENCHMARK(Intake)->Unit(benchmark::kMillisecond);
+
+void StopAfterMessages(benchmark::State& state) {
+  Host host;
+  MessageMaker maker;
+  double bytes_per_message = 0;
+  for (auto _ : state) {
+    state.PauseTiming();
+    auto session = host.makeSession();
+    session->start();
+    const auto before = mallinfo2();
+    for (std::int64_t i = 0; i < state.range(0); ++i) send(*session, maker);
+    const auto after = mallinfo2();
+    bytes_per_message = static_cast<double>(after.uordblks + after.hblkhd - before.uordblks - before.hblkhd) /
+                        static_cast<double>(state.range(0));
+    state.ResumeTiming();
+    session->stop();
+  }
+  state.counters["bytes_per_kept_message"] = bytes_per_message;
+}
+BENCHMARK(StopAfterMessages)->Arg(10'000)->Arg(100'000)->Arg(1'000'000)->Unit(benchmark::kMillisecond);
+
+void SessionLife(benchmark::State& state) {
+  Host host;
+  for (auto _ : state) {
+    auto session = host.makeSession();
+    session->setServiceType(AudioServiceType::kLongformaudio);
+    session->start();
+    session->stop();
+  }
+}
+BENCHMARK(SessionLife)->Unit(benchmark::kMicrosecond);
+
+void StartedSessions(benchmark::State& state) {
+  Host host;
+  constexpr int kSessions = 10'000;
+  double bytes = 0;
+  for (auto _ : state) {
+    std::vector<std::unique_ptr<TalReportingSession>> sessions;
+    sessions.reserve(kSessions);
+    const auto before = mallinfo2();
+    for (int i = 0; i < kSessions; ++i) {
+      sessions.push_back(host.makeSession());
+      sessions.back()->start();
+    }
+    bytes = static_cast<double>(mallinfo2().uordblks - before.uordblks) / kSessions;
+  }
+  state.counters["bytes_per_started_session"] = bytes;
+}
+BENCHMARK(StartedSessions)->Unit(benchmark::kMillisecond);
+
+}  // namespace
+}  // namespace tal
+
+BENCHMARK_MAIN();
