@@ -19,13 +19,9 @@ constexpr std::size_t kSharedSuccessorLimit = 32;
 // would turn each look-up into a walk over all of them.
 class SeededHash {
  public:
-  SeededHash() {
-    std::random_device device;
-    seed_ = (std::uint64_t{device()} << 32) | device();
-  }
   using is_transparent = void;
   std::size_t operator()(std::string_view text) const {
-    std::uint64_t hash = seed_;
+    std::uint64_t hash = seed();
     for (const char character : text) {
       hash = (hash ^ static_cast<unsigned char>(character)) * 0x9FB21C651E98DF25ULL;
       hash ^= hash >> 29;
@@ -34,7 +30,14 @@ class SeededHash {
   }
 
  private:
-  std::uint64_t seed_;
+  // One secret a process: to ask for one costs more than a small session's whole life.
+  static std::uint64_t seed() {
+    static const std::uint64_t kSeed = [] {
+      std::random_device device;
+      return (std::uint64_t{device()} << 32) | device();
+    }();
+    return kSeed;
+  }
 };
 
 }  // namespace

@@ -29,12 +29,12 @@ inline constexpr std::string_view gReportingNotifydNotificationName = "org.vantl
 ///
 /// Features and their sources:
 ///
-/// | feature | source | read anew at the notification |
-/// |---|---|---|
-/// | "spatial-audio-accessory-feature" | that key of the settings domain "org.vantle.homeshell" |
-/// "org.vantle.homeshell.spatial-audio-accessory-feature.changed" | | "device_name" | that key of
-/// "org.vantle.talsys" | "org.vantle.talsys.reporting" | | "ringerstate" | true when the notification's state
-/// is 1 | "org.vantle.homeshell.ringerstate" |
+/// - "spatial-audio-accessory-feature": that key of the settings domain
+///   "org.vantle.homeshell"; read anew at
+///   "org.vantle.homeshell.spatial-audio-accessory-feature.changed";
+/// - "device_name": that key of "org.vantle.talsys"; at "org.vantle.talsys.reporting";
+/// - "ringerstate": true when the state of the notification
+///   "org.vantle.homeshell.ringerstate" is 1; at that notification.
 ///
 /// A feature state holds the value, as it is stored, under the feature's name,
 /// "talreporting_timestamp" (seconds since 1970) and "systemuptime_sec" (whole

@@ -16,6 +16,11 @@ using namespace std::chrono_literals;
 class SystemStateOfTree : public ::testing::Test {
  protected:
   void write(const std::string& path, const std::string& text) { test::writeFile(root.path() / path, text); }
+  // Readings are kept for a second.
+  void change(const std::string& path, const std::string& text) {
+    write(path, text);
+    clock.advance(1s);
+  }
 
   test::TemporaryDirectory root;
   test::HandClock clock;
@@ -32,10 +37,10 @@ TEST_F(SystemStateOfTree, WorstZoneDecidesTheThermalState) {
                                                                  {"active", "70000"},
                                                                  {"critical", "0"}};
     for (std::size_t i = 0; i < trips.size(); ++i) {
-      write(path + "trip_point_" + std::to_string(i) + "_type", trips[i].first + "\n");
-      write(path + "trip_point_" + std::to_string(i) + "_temp", trips[i].second + "\n");
+      change(path + "trip_point_" + std::to_string(i) + "_type", trips[i].first + "\n");
+      change(path + "trip_point_" + std::to_string(i) + "_temp", trips[i].second + "\n");
     }
-    write(path + "temp", temperature + "\n");
+    change(path + "temp", temperature + "\n");
   };
   zone(0, "20000");
   const std::vector<std::pair<std::string, int>> rows{
@@ -48,12 +53,12 @@ TEST_F(SystemStateOfTree, WorstZoneDecidesTheThermalState) {
 
 TEST_F(SystemStateOfTree, LowPowerIsAProfileOrABatterySaver) {
   EXPECT_FALSE(state.lowPowerModeIsOn());
-  write("sys/firmware/acpi/platform_profile", "balanced\n");
+  change("sys/firmware/acpi/platform_profile", "balanced\n");
   EXPECT_FALSE(state.lowPowerModeIsOn());
-  write("sys/module/battery_saver/parameters/enabled", "Y\n");
+  change("sys/module/battery_saver/parameters/enabled", "Y\n");
   EXPECT_TRUE(state.lowPowerModeIsOn());
-  write("sys/module/battery_saver/parameters/enabled", "N\n");
-  write("sys/firmware/acpi/platform_profile", "low-power\n");
+  change("sys/module/battery_saver/parameters/enabled", "N\n");
+  change("sys/firmware/acpi/platform_profile", "low-power\n");
   EXPECT_TRUE(state.lowPowerModeIsOn());
 }
 
@@ -71,8 +76,10 @@ TEST_F(SystemStateOfTree, FootprintIsTheProportionalSetElseTheResidentAskedOnceA
 
 TEST_F(SystemStateOfTree, LoadAverages) {
   EXPECT_EQ(state.loadAverages(), (std::array<double, 3>{0, 0, 0}));
-  write("proc/loadavg", "0.52 0.58 1.59 1/597 12345\n");
+  change("proc/loadavg", "0.52 0.58 1.59 1/597 12345\n");
   EXPECT_EQ(state.loadAverages(), (std::array<double, 3>{0.52, 0.58, 1.59}));
+  write("proc/loadavg", "9.00 9.00 9.00 1/597 12345\n");
+  EXPECT_EQ(state.loadAverages()[0], 0.52) << "asked once a second";
 }
 
 TEST(LinuxSystemState, OfThisMachineAnswers) {

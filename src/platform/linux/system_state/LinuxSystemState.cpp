@@ -19,7 +19,7 @@ namespace fs = std::filesystem;
 
 enum Thermal : int { kNominal = 0, kFair = 1, kSerious = 2, kCritical = 3 };
 
-constexpr auto kFootprintAge = std::chrono::seconds(1);
+constexpr auto kReadingAge = std::chrono::seconds(1);
 // The kernel numbers trip points without gaps, and no driver has more.
 constexpr int kMostTripPoints = 64;
 
@@ -65,7 +65,31 @@ Thermal zoneState(const fs::path& zone) {
 LinuxSystemState::LinuxSystemState(const Clock& clock, fs::path root)
     : clock_(clock), root_(std::move(root)) {}
 
+template <typename Value>
+const Value& LinuxSystemState::recent(Reading<Value>& reading,
+                                      Value (LinuxSystemState::*read)() const) const {
+  const auto now = clock_.monotonic();
+  if (!reading.time || now - *reading.time >= kReadingAge) reading = {(this->*read)(), now};
+  return reading.value;
+}
+
 int LinuxSystemState::thermalState() const {
+  return recent(thermal_state_, &LinuxSystemState::readThermalState);
+}
+
+bool LinuxSystemState::lowPowerModeIsOn() const {
+  return recent(low_power_mode_, &LinuxSystemState::readLowPowerMode);
+}
+
+SystemState::Footprint LinuxSystemState::physicalFootprint() const {
+  return recent(footprint_, &LinuxSystemState::measureFootprint);
+}
+
+std::array<double, 3> LinuxSystemState::loadAverages() const {
+  return recent(load_averages_, &LinuxSystemState::readLoadAverages);
+}
+
+int LinuxSystemState::readThermalState() const {
   Thermal worst = kNominal;
   std::error_code missing;
   for (const auto& entry : fs::directory_iterator(root_ / "sys/class/thermal", missing)) {
@@ -75,19 +99,10 @@ int LinuxSystemState::thermalState() const {
   return worst;
 }
 
-bool LinuxSystemState::lowPowerModeIsOn() const {
+bool LinuxSystemState::readLowPowerMode() const {
   const auto profile = readLine(root_ / "sys/firmware/acpi/platform_profile");
   const auto saver = readLine(root_ / "sys/module/battery_saver/parameters/enabled");
   return profile == "low-power" || saver == "Y" || saver == "1";
-}
-
-SystemState::Footprint LinuxSystemState::physicalFootprint() const {
-  const auto now = clock_.monotonic();
-  if (!footprint_time_ || now - *footprint_time_ >= kFootprintAge) {
-    footprint_ = measureFootprint();
-    footprint_time_ = now;
-  }
-  return footprint_;
 }
 
 SystemState::Footprint LinuxSystemState::measureFootprint() const {
@@ -108,7 +123,7 @@ SystemState::Footprint LinuxSystemState::measureFootprint() const {
   return {std::nullopt, error == 0 ? "unreadable" : std::generic_category().message(error)};
 }
 
-std::array<double, 3> LinuxSystemState::loadAverages() const {
+std::array<double, 3> LinuxSystemState::readLoadAverages() const {
   std::ifstream file(root_ / "proc/loadavg");
   std::array<double, 3> averages{};
   for (double& average : averages) file >> average;

@@ -21,6 +21,9 @@ namespace tal {
 /// - proc/self/smaps_rollup: the proportional set size; where the kernel has none,
 ///   the resident set of proc/self/statm.
 /// - proc/loadavg.
+///
+/// Each is read at most once a second: many sessions stop at once when a client
+/// ends, and the footprint makes the kernel walk all of the process's memory.
 class LinuxSystemState final : public SystemState {
  public:
   /// `clock` outlives this. Another root than "/" serves a test.
@@ -28,17 +31,29 @@ class LinuxSystemState final : public SystemState {
 
   int thermalState() const override;
   bool lowPowerModeIsOn() const override;
-  /// Asked of the kernel at most once a second: it walks all of the process's memory.
   Footprint physicalFootprint() const override;
   std::array<double, 3> loadAverages() const override;
 
  private:
+  template <typename Value>
+  struct Reading {
+    Value value{};
+    std::optional<Clock::Instant> time;
+  };
+  template <typename Value>
+  const Value& recent(Reading<Value>& reading, Value (LinuxSystemState::*read)() const) const;
+
+  int readThermalState() const;
+  bool readLowPowerMode() const;
   Footprint measureFootprint() const;
+  std::array<double, 3> readLoadAverages() const;
 
   const Clock& clock_;
   const std::filesystem::path root_;
-  mutable std::optional<Clock::Instant> footprint_time_;
-  mutable Footprint footprint_;
+  mutable Reading<int> thermal_state_;
+  mutable Reading<bool> low_power_mode_;
+  mutable Reading<Footprint> footprint_;
+  mutable Reading<std::array<double, 3>> load_averages_;
 };
 
 }  // namespace tal
