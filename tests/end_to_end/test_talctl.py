@@ -220,6 +220,27 @@ class TalctlTest(DaemonTest):
         daemon.eventually(only_wanted, "the daemon sees the setting")
         self.assertTrue(daemon.rows("SELECT 1 FROM events WHERE name LIKE '%.Volume.%'"))
 
+    def test_a_posted_notification_brings_a_new_device_name_into_running_sessions(self):
+        self.started_client(61, service=7)
+        self.started_client(62, service=2)
+        for name in ("Kitchen", "Bathroom"):
+            self.daemon.write_config("settings/org.vantle.talsys.toml", f'device_name = "{name}"\n')
+            self.run_ok("notify", "post", "org.vantle.talsys.reporting")
+            for service in ("longformaudio", "telephony"):
+                self.daemon.eventually(
+                    lambda: self.daemon.events(f"org.vantle.{service}.Setup.Setup", device_name=name),
+                    f"a session of {service} is told of {name}")
+
+    def test_a_post_without_a_state_keeps_it(self):
+        file = self.daemon.root / "run/notify/org.vantle.test"
+        for arguments, state in (([], "0"), (["18446744073709551615"], "18446744073709551615"), ([], "18446744073709551615"),
+                                 (["7"], "7"), ([], "7")):
+            self.run_ok("notify", "post", "org.vantle.test", *arguments)
+            self.assertEqual(file.read_text(), state)
+        file.write_text("seven")
+        self.assertIn("cannot be kept", self.run_badly(1, "notify", "post", "org.vantle.test"))
+        self.run_badly(1, "notify", "post", "org.vantle.test", root=self.daemon.root / "nowhere")
+
     def test_kill_ends_the_daemon(self):
         daemon = self.start_daemon()
         if os.geteuid() == 0:
@@ -247,7 +268,9 @@ class TalctlTest(DaemonTest):
                         ["send", "1", "1", "n=null"], ["send", "1", "1", "j={"], ["send", "--reporter", "x", "1", "1"],
                         ["events", "--since", "yesterday"], ["events", "-n", "-1"], ["events", "extra"],
                         ["settings"], ["settings", "get"], ["settings", "get", "../passwd"],
-                        ["settings", "set", "a", "b"], ["--socket", "x", "status"]):
+                        ["settings", "set", "a", "b"], ["notify"], ["notify", "post"], ["notify", "post", "a/b"],
+                        ["notify", "post", ".a"], ["notify", "post", "a", "-1"], ["notify", "post", "a", ""],
+                        ["notify", "post", "a", "18446744073709551616"], ["notify", "post", "a", "1", "2"], ["--socket", "x", "status"]):
             with self.subTest(command):
                 self.run_badly(2, *command)
 

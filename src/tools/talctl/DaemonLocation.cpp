@@ -10,6 +10,7 @@
 #include <cstring>
 #include <vector>
 
+#include "platform/linux/notify/NotifyFiles.h"
 #include "tools/talctl/CommandFailure.h"
 
 namespace tal::talctl {
@@ -97,6 +98,11 @@ fs::path require(const std::optional<fs::path>& directory) {
 }  // namespace
 
 fs::path DaemonLocation::storePath() const { return require(state_directory) / "store.db"; }
+
+fs::path DaemonLocation::notifyDirectory() const {
+  require(state_directory);  // else the socket need not stand in the daemon's own runtime directory
+  return socket.parent_path() / kNotifyFolder;
+}
 
 fs::path DaemonLocation::stateSettingsPath(const std::string& domain) const {
   return require(state_directory) / "settings" / (domain + ".toml");

@@ -16,6 +16,8 @@ struct DaemonLocation {
   std::optional<std::filesystem::path> config_directory;
 
   std::filesystem::path storePath() const;
+  /// Where notifications are posted, whether it is there already or not.
+  std::filesystem::path notifyDirectory() const;
   /// The two layers of a settings domain.
   std::filesystem::path stateSettingsPath(const std::string& domain) const;
   std::filesystem::path configSettingsPath(const std::string& domain) const;

@@ -6,12 +6,14 @@
 #include <exception>
 #include <functional>
 #include <iostream>
+#include <optional>
 #include <string>
 
 #include "tools/talctl/CommandFailure.h"
 #include "tools/talctl/DaemonCommands.h"
 #include "tools/talctl/DaemonLocation.h"
 #include "tools/talctl/EventsCommand.h"
+#include "tools/talctl/NotifyCommand.h"
 #include "tools/talctl/ReplayCommand.h"
 #include "tools/talctl/SettingsCommand.h"
 #include "tools/talctl/Terminal.h"
@@ -30,6 +32,8 @@ struct CommandLine {
   SendOptions send;
   EventsOptions events;
   std::string script;
+  std::string notification;
+  std::string state;
   std::string domain;
   std::string key;
   std::string value;
@@ -85,6 +89,19 @@ void addEvents(CLI::App& app, CommandLine& line) {
   });
 }
 
+void addNotify(CLI::App& app, CommandLine& line) {
+  CLI::App* command = app.add_subcommand("notify", "Tell programs that something has changed");
+  command->require_subcommand(1);
+  CLI::App* post = command->add_subcommand("post", "Post a notification");
+  post->add_option("NAME", line.notification, "Such as org.vantle.talsys.reporting")->required();
+  CLI::Option* state = post->add_option("STATE", line.state, "Without it, the state stays (0 at first)");
+  post->callback([&line, state] {
+    line.run = [&line, state](const auto& daemon, const auto&) {
+      runNotifyPost(daemon, line.notification, state->count() > 0 ? std::optional(line.state) : std::nullopt);
+    };
+  });
+}
+
 void addSettings(CLI::App& app, CommandLine& line) {
   CLI::App* command = app.add_subcommand("settings", "Read and write settings");
   command->require_subcommand(1);
@@ -130,6 +147,7 @@ int run(int argc, char** argv) {
   addSend(app, line);
   addReplay(app, line);
   addEvents(app, line);
+  addNotify(app, line);
   addSettings(app, line);
   addKill(app, line);
 
