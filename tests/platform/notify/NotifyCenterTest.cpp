@@ -1,8 +1,11 @@
 // What every implementation of notifications promises, the tests' own included,
 // and what the files add to it.
 
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/file.h>
+#include <unistd.h>
 
 #include <functional>
 #include <memory>
@@ -210,6 +213,30 @@ TEST_F(NotifyCenterOnLinux, GoesOnInADirectoryThatWasRemovedOrReplaced) {
   while (journal.back() != "2") ASSERT_NO_FATAL_FAILURE(queue.runNext());
   EXPECT_EQ(center.post("a", 3), NotifyStatus::kOk);
   while (journal.back() != "3") ASSERT_NO_FATAL_FAILURE(queue.runNext());
+}
+
+TEST_F(NotifyCenterOnLinux, PostsBehindWhoeverSitsOnTheLockAreMadeLaterAndInOrder) {
+  watch("a");
+  const int holder = ::open(folder().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  ASSERT_EQ(::flock(holder, LOCK_EX), 0);
+  EXPECT_EQ(center.post("a", 1), NotifyStatus::kOk);
+  EXPECT_FALSE(std::filesystem::exists(folder() / "a")) << "the poster did not wait";
+  EXPECT_EQ(center.post("a", 2), NotifyStatus::kOk);
+  ::close(holder);
+  EXPECT_EQ(center.post("a", 3), NotifyStatus::kOk);
+  for (int told = 0; told < 3; ++told) ASSERT_NO_FATAL_FAILURE(queue.runNext());
+  EXPECT_EQ(journal.back(), "3");
+}
+
+TEST_F(NotifyCenterOnLinux, PostsThatWaitAreMadeBeforeItEnds) {
+  {
+    LinuxNotifyCenter ending(host.directory.path(), host.log.service);
+    const int holder = ::open(folder().c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+    ASSERT_EQ(::flock(holder, LOCK_EX), 0);
+    EXPECT_EQ(ending.post("a", 1), NotifyStatus::kOk);
+    ::close(holder);
+  }
+  EXPECT_EQ(test::readFile(folder() / "a"), "1");
 }
 
 TEST(NotifyCenterWithoutADirectory, SaysSoOnceAndStillEndsInOrder) {

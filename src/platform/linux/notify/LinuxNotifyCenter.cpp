@@ -6,8 +6,6 @@
 #include <system_error>
 #include <utility>
 
-#include "platform/linux/notify/NotifyFiles.h"
-
 namespace tal {
 
 struct LinuxNotifyCenter::Watcher {
@@ -74,7 +72,21 @@ NotifyStatus LinuxNotifyCenter::cancel(Token token) {
 
 NotifyStatus LinuxNotifyCenter::post(std::string_view name, std::optional<std::uint64_t> state) {
   if (!isNotificationName(name)) return NotifyStatus::kInvalidName;
-  const auto error = postNotification(directory_.path(), name, state);
+  if (!waiting_posts_.idle()) return postLater(name, state);  // posts keep their order
+  const auto posted = postNotificationAtOnce(directory_.path(), name, state);
+  if (const auto* error = std::get_if<NotifyError>(&posted)) return statusOf(name, *error);
+  return std::get<bool>(posted) ? NotifyStatus::kOk : postLater(name, state);
+}
+
+NotifyStatus LinuxNotifyCenter::postLater(std::string_view name, std::optional<std::uint64_t> state) {
+  const bool waits = waiting_posts_.add([this, name = std::string(name), state] {
+    statusOf(name, postNotification(directory_.path(), name, state));
+  });
+  return waits ? NotifyStatus::kOk : statusOf(name, NotifyError{"too many posts wait for other programs"});
+}
+
+NotifyStatus LinuxNotifyCenter::statusOf(std::string_view name,
+                                         const std::optional<NotifyError>& error) const {
   if (!error) return NotifyStatus::kOk;
   TAL_LOG_ERROR(log_, "notification ", name, " was not posted: ", error->reason);
   return NotifyStatus::kFailed;

@@ -10,6 +10,8 @@
 #include "core/Log.h"
 #include "platform/NotifyCenter.h"
 #include "platform/linux/notify/NotifyDirectory.h"
+#include "platform/linux/notify/NotifyFiles.h"
+#include "platform/linux/process/BackgroundWork.h"
 
 namespace tal {
 
@@ -35,12 +37,16 @@ class LinuxNotifyCenter final : public NotifyCenter {
   Registration registerDispatch(std::string_view name, SerialQueue& queue, Handler handler) override;
   State getState(Token token) override;
   NotifyStatus cancel(Token token) override;
-  /// Waits up to a third of a second for other programs that are posting.
+  /// Does not wait: while other programs are posting, and after this one's own
+  /// posts that wait for them, the post is made a moment later on another thread,
+  /// which logs what fails.
   NotifyStatus post(std::string_view name, std::optional<std::uint64_t> state) override;
 
  private:
   struct Watcher;
 
+  NotifyStatus postLater(std::string_view name, std::optional<std::uint64_t> state);
+  NotifyStatus statusOf(std::string_view name, const std::optional<NotifyError>& error) const;
   void run();
   void tell(const NotifyDirectory::Changes& changes);
   static void tellOnce(const std::shared_ptr<Watcher>& watcher);
@@ -52,6 +58,7 @@ class LinuxNotifyCenter final : public NotifyCenter {
   Token last_token_ = 0;
   std::map<Token, std::shared_ptr<Watcher>> watchers_;
   std::thread thread_;  // last of the state that it uses
+  BackgroundWork waiting_posts_{"notify-post"};
 };
 
 }  // namespace tal

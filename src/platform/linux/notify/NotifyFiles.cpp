@@ -81,11 +81,15 @@ std::variant<std::uint64_t, NotifyError> readState(int directory, const std::str
 // Posters take turns, so that one that keeps the state does not bring back what
 // another has just replaced. Where somebody sits on the lock, posting goes on
 // without: that would otherwise silence every notification.
-void takeTurn(int directory) {
+void waitForTurn(int directory) {
   for (int attempt = 0; attempt < kMostLockAttempts; ++attempt) {
     if (::flock(directory, LOCK_EX | LOCK_NB) == 0) return;
     std::this_thread::sleep_for(kBetweenLockAttempts);
   }
+}
+
+bool takeTurnAtOnce(int directory) {
+  return ::flock(directory, LOCK_EX | LOCK_NB) == 0 || errno != EWOULDBLOCK;
 }
 
 // A name that no other poster uses, whatever program or container it lives in.
@@ -101,6 +105,50 @@ bool writeNew(int directory, const std::string& name, const std::string& content
   const ssize_t written = ::write(file.descriptor(), content.data(), content.size());
   if (written >= 0 && static_cast<std::size_t>(written) != content.size()) errno = ENOSPC;
   return written == static_cast<ssize_t>(content.size());
+}
+
+/// One post, made once it is this poster's turn, which ends with the object.
+class Poster {
+ public:
+  Poster(const std::filesystem::path& directory, std::string_view name)
+      : path_(directory.string()), name_(name), error_(makeReady(directory)) {}
+
+  /// Why nothing can be posted.
+  const std::optional<NotifyError>& error() const { return error_; }
+  int directory() const { return opened_->descriptor(); }
+  std::optional<NotifyError> post(std::optional<std::uint64_t> state) const;
+
+ private:
+  std::optional<NotifyError> makeReady(const std::filesystem::path& directory) {
+    if (!isNotificationName(name_)) return NotifyError{"is no name of a notification"};
+    if (const std::error_code error = makeNotifyDirectory(directory))
+      return NotifyError{path_ + ": " + error.message()};
+    opened_.emplace(openDirectory(directory));
+    if (!opened_->isOpen()) return NotifyError{path_ + ": " + lastError()};
+    return std::nullopt;
+  }
+
+  const std::string path_;
+  const std::string name_;
+  std::optional<File> opened_;
+  const std::optional<NotifyError> error_;  // last: made of the others
+};
+
+std::optional<NotifyError> Poster::post(std::optional<std::uint64_t> state) const {
+  if (!state) {
+    const auto kept = readState(directory(), name_);
+    if (const auto* error = std::get_if<NotifyError>(&kept))
+      return NotifyError{"its state cannot be kept: " + error->reason};
+    state = std::get<std::uint64_t>(kept);
+  }
+  const std::string unfinished = unfinishedName();
+  if (writeNew(directory(), unfinished, std::to_string(*state)) &&
+      ::renameat(directory(), unfinished.c_str(), directory(), name_.c_str()) == 0) {
+    return std::nullopt;
+  }
+  const std::string reason = lastError();
+  ::unlinkat(directory(), unfinished.c_str(), 0);
+  return NotifyError{path_ + ": " + reason};
 }
 
 }  // namespace
@@ -136,27 +184,20 @@ std::variant<std::uint64_t, NotifyError> readNotificationState(const std::filesy
 
 std::optional<NotifyError> postNotification(const std::filesystem::path& directory, std::string_view name,
                                             std::optional<std::uint64_t> state) {
-  if (!isNotificationName(name)) return NotifyError{"is no name of a notification"};
-  if (const std::error_code error = makeNotifyDirectory(directory))
-    return NotifyError{directory.string() + ": " + error.message()};
-  const File opened(openDirectory(directory));
-  if (!opened.isOpen()) return NotifyError{directory.string() + ": " + lastError()};
-  takeTurn(opened.descriptor());
-  const std::string file_name(name);
-  if (!state) {
-    const auto kept = readState(opened.descriptor(), file_name);
-    if (const auto* error = std::get_if<NotifyError>(&kept))
-      return NotifyError{"its state cannot be kept: " + error->reason};
-    state = std::get<std::uint64_t>(kept);
-  }
-  const std::string unfinished = unfinishedName();
-  if (writeNew(opened.descriptor(), unfinished, std::to_string(*state)) &&
-      ::renameat(opened.descriptor(), unfinished.c_str(), opened.descriptor(), file_name.c_str()) == 0) {
-    return std::nullopt;
-  }
-  const std::string reason = lastError();
-  ::unlinkat(opened.descriptor(), unfinished.c_str(), 0);
-  return NotifyError{directory.string() + ": " + reason};
+  const Poster poster(directory, name);
+  if (poster.error()) return poster.error();
+  waitForTurn(poster.directory());
+  return poster.post(state);
+}
+
+std::variant<bool, NotifyError> postNotificationAtOnce(const std::filesystem::path& directory,
+                                                       std::string_view name,
+                                                       std::optional<std::uint64_t> state) {
+  const Poster poster(directory, name);
+  if (poster.error()) return *poster.error();
+  if (!takeTurnAtOnce(poster.directory())) return false;
+  if (auto error = poster.post(state)) return std::move(*error);
+  return true;
 }
 
 }  // namespace tal

@@ -42,4 +42,10 @@ std::variant<std::uint64_t, NotifyError> readNotificationState(const std::filesy
 std::optional<NotifyError> postNotification(const std::filesystem::path& directory, std::string_view name,
                                             std::optional<std::uint64_t> state);
 
+/// As above, for those who must not wait: false when it is another's turn, and
+/// nothing has been posted.
+std::variant<bool, NotifyError> postNotificationAtOnce(const std::filesystem::path& directory,
+                                                       std::string_view name,
+                                                       std::optional<std::uint64_t> state);
+
 }  // namespace tal
