@@ -34,6 +34,7 @@ class SystemClock final : public Clock {
   Instant monotonic() const override { return std::chrono::steady_clock::now().time_since_epoch(); }
   TimeReading read() const override { return {secondsSince1970(), 0, 0}; }
   std::string localTimeForFileName() const override { return "20260131-144502+0000"; }
+  void sleepFor(std::chrono::nanoseconds) const override {}
 };
 
 class NoTrace final : public TracePoints {
@@ -98,6 +99,11 @@ class NoDiagnosticLog final : public DiagnosticLog {
   Opened createFile(std::string_view, std::string_view) override { return {nullptr, "none here"}; }
 };
 
+class NoFlutterRequests final : public FlutterRequestService {
+ public:
+  void requestFlutter(FlutterRequest) override {}
+};
+
 struct Host {
   NoQueue queue;
   SystemClock clock;
@@ -110,6 +116,7 @@ struct Host {
   NothingWanted analytics;
   CalmDevice system_state;
   NoDiagnosticLog diagnostic_log;
+  NoFlutterRequests flutter_requests;
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
                     .log = log,
@@ -120,7 +127,8 @@ struct Host {
                     .processes = processes,
                     .analytics = analytics,
                     .system_state = system_state,
-                    .diagnostic_log = diagnostic_log};
+                    .diagnostic_log = diagnostic_log,
+                    .flutter_requests = flutter_requests};
   TalReportingSystemMonitor system_monitor{platform};
   std::unique_ptr<WorkerRoster> roster = makeWorkerRoster(platform, system_monitor);
   std::size_t kept_bytes = 0;

@@ -14,6 +14,7 @@
 #include "daemon/StoreDurabilityGate.h"
 #include "platform/Platform.h"
 #include "platform/linux/diagnostic_log/LinuxDiagnosticLog.h"
+#include "platform/linux/flutter/UnavailableFlutterRequestService.h"
 #include "platform/linux/ipc/IpcListener.h"
 #include "platform/linux/logging/StderrLogSink.h"
 #include "platform/linux/notify/LinuxNotifyCenter.h"
@@ -66,6 +67,7 @@ class Daemon {
   LinuxNotifyCenter notify_center_;
   LinuxSystemState system_state_;
   LinuxDiagnosticLog diagnostic_log_;
+  UnavailableFlutterRequestService flutter_requests_;
   // Destroyed after the queue's thread, whose tasks use them, has ended.
   ReportingQueue queue_;
   const Platform platform_;

@@ -21,6 +21,8 @@ class Clock {
   virtual TimeReading read() const = 0;
   /// The local time as file names bear it: "20240131-154502+0100".
   virtual std::string localTimeForFileName() const = 0;
+  /// Holds the calling thread for so long, and with it the queue that it serves.
+  virtual void sleepFor(std::chrono::nanoseconds duration) const = 0;
 };
 
 }  // namespace tal

@@ -5,6 +5,7 @@
 #include "platform/Clock.h"
 #include "platform/DeviceProperties.h"
 #include "platform/DiagnosticLog.h"
+#include "platform/FlutterRequestService.h"
 #include "platform/NotifyCenter.h"
 #include "platform/ProcessTable.h"
 #include "platform/SerialQueue.h"
@@ -28,6 +29,7 @@ struct Platform {
   AnalyticsSink& analytics;
   const SystemState& system_state;
   DiagnosticLog& diagnostic_log;
+  FlutterRequestService& flutter_requests;
   /// `TalReportingUtilityIsInternalBuild`, asked once.
   bool internal_build = false;
 };

@@ -18,6 +18,7 @@ class StandingClock final : public Clock {
     return now_;
   }
   std::string localTimeForFileName() const override { return "20260131-144502+0000"; }
+  void sleepFor(std::chrono::nanoseconds) const override {}
   TimeReading read() const override {
     const std::lock_guard lock(mutex_);
     return {.seconds_since_1970 = wall_, .uptime_seconds = 0, .processor_ticks = 0};

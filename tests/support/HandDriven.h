@@ -19,19 +19,23 @@ class HandClock final : public Clock {
   Instant monotonic() const override { return now_; }
   TimeReading read() const override { return {wall_, uptime_seconds, processor_ticks}; }
   std::string localTimeForFileName() const override { return "20240131-154502+0100"; }
+  /// Whoever sleeps moves the clock.
+  void sleepFor(std::chrono::nanoseconds duration) const override { move(duration); }
 
-  void advance(std::chrono::nanoseconds by) {
-    now_ += by;
-    wall_ += std::chrono::duration<double>(by).count();
-  }
+  void advance(std::chrono::nanoseconds by) { move(by); }
   void setWall(double seconds_since_1970) { wall_ = seconds_since_1970; }
 
   double uptime_seconds = 0;
   std::int64_t processor_ticks = 0;
 
  private:
-  Instant now_{0};
-  double wall_ = 1'800'000'000;
+  void move(std::chrono::nanoseconds by) const {
+    now_ += by;
+    wall_ += std::chrono::duration<double>(by).count();
+  }
+
+  mutable Instant now_{0};
+  mutable double wall_ = 1'800'000'000;
 };
 
 class HandQueue final : public SerialQueue {

@@ -14,6 +14,7 @@
 
 #include "core/Log.h"
 #include "platform/Platform.h"
+#include "support/FakeFlutterRequestService.h"
 #include "support/FakeNotifyCenter.h"
 #include "support/HandDriven.h"
 
@@ -168,6 +169,7 @@ struct TestPlatform {
   RecordingAnalyticsSink analytics;
   FakeSystemState system_state;
   FakeDiagnosticLog diagnostic_log;
+  FakeFlutterRequestService flutter_requests;
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
                     .log = channels,
@@ -178,7 +180,8 @@ struct TestPlatform {
                     .processes = processes,
                     .analytics = analytics,
                     .system_state = system_state,
-                    .diagnostic_log = diagnostic_log};
+                    .diagnostic_log = diagnostic_log,
+                    .flutter_requests = flutter_requests};
 };
 
 }  // namespace tal::test

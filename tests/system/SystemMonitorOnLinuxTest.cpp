@@ -44,7 +44,8 @@ TEST(SystemMonitorOnLinux, ANewDeviceNameReachesEveryRunningSessionAtItsNotifica
                           .processes = host.processes,
                           .analytics = host.analytics,
                           .system_state = host.system_state,
-                          .diagnostic_log = host.diagnostic_log};
+                          .diagnostic_log = host.diagnostic_log,
+                          .flutter_requests = host.flutter_requests};
   write_name("one");
   TalReportingSystemMonitor monitor(platform);
   monitor.initializeWithQueue(queue);

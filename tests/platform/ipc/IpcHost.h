@@ -133,6 +133,7 @@ class IpcHost {
   RowPerEvent sink{gate};
   FakeSystemState system_state;
   FakeDiagnosticLog diagnostic_log;
+  FakeFlutterRequestService flutter_requests;
   ReportingQueue queue{"test"};
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
@@ -144,7 +145,8 @@ class IpcHost {
                     .processes = processes,
                     .analytics = sink,
                     .system_state = system_state,
-                    .diagnostic_log = diagnostic_log};
+                    .diagnostic_log = diagnostic_log,
+                    .flutter_requests = flutter_requests};
   TalReportingSystemMonitor system_monitor{platform};
   std::unique_ptr<WorkerRoster> roster = makeWorkerRoster(platform, system_monitor);
   std::promise<void> killed;

@@ -1,6 +1,7 @@
 #include "platform/linux/process/LinuxClock.h"
 
 #include <ctime>
+#include <thread>
 
 namespace tal {
 
@@ -42,5 +43,7 @@ std::string LinuxClock::localTimeForFileName() const {
   char text[32];
   return {text, std::strftime(text, sizeof text, "%Y%m%d-%H%M%S%z", &local)};
 }
+
+void LinuxClock::sleepFor(std::chrono::nanoseconds duration) const { std::this_thread::sleep_for(duration); }
 
 }  // namespace tal

@@ -16,6 +16,7 @@ class LinuxClock final : public Clock {
   TimeReading read() const override;
 
   std::string localTimeForFileName() const override;
+  void sleepFor(std::chrono::nanoseconds duration) const override;
 
   /// Monotonic time as of the kernel's last tick (a few milliseconds): a quarter
   /// of the price, for those who ask per message whether it is time to look
