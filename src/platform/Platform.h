@@ -10,6 +10,7 @@
 #include "platform/ProcessTable.h"
 #include "platform/SerialQueue.h"
 #include "platform/SettingsStore.h"
+#include "platform/SymptomReporterService.h"
 #include "platform/SystemState.h"
 #include "platform/TracePoints.h"
 
@@ -30,6 +31,8 @@ struct Platform {
   const SystemState& system_state;
   DiagnosticLog& diagnostic_log;
   FlutterRequestService& flutter_requests;
+  /// Null on a host that takes no captures, as on every customer build.
+  SymptomReporterFactory* symptom_reporters = nullptr;
   /// `TalReportingUtilityIsInternalBuild`, asked once.
   bool internal_build = false;
 };

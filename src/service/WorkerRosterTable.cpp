@@ -9,6 +9,7 @@
 #include "workers/derived/TalReportingSessionHuddleMessagesWorker.h"
 #include "workers/derived/TalReportingSessionInputMessagesWorker.h"
 #include "workers/derived/TalReportingSessionVolumeMessagesWorker.h"
+#include "workers/diagnostics/TalReportingSessionHoundWorker.h"
 #include "workers/sinks/TalReportingSessionDPWorker.h"
 #include "workers/sinks/TalReportingSessionSummaryJsonFileWorker.h"
 #include "workers/sinks/TalReportingSessionSummaryWorker.h"
@@ -48,7 +49,7 @@ std::unique_ptr<WorkerRoster> makeWorkerRoster(const Platform& platform,
   classes.push_back(declining("TalReportingSessionPlumeWorker", kSingleMessageConsumerFromInit));
   classes.push_back(declining("TalReportingSessionDriverSnapshotWorker", kProducer));
   classes.push_back(std::make_unique<TalReportingSessionSystemMonitorWorkerClass>(system_monitor));
-  classes.push_back(declining("TalReportingSessionHoundWorker", kSingleMessageConsumer));
+  classes.push_back(std::make_unique<TalReportingSessionHoundWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionDPWorkerClass>(platform));
   classes.push_back(std::make_unique<TalReportingSessionSummaryJsonFileWorkerClass>());
   classes.push_back(declining("TalReportingSessionAudioRegistrationWorker", kConsumer));
