@@ -77,6 +77,22 @@ STREAMS = {
 
 READ_SIZES = (1, 7, 256)
 
+# Protocol-buffers fields, well-formed and not.
+RECORDS = {
+    "default": "10 00 1A 00 22 00 2A 00",
+    "full": "08 01 10 FFFFFFFFFFFFFFFFFF01 1A 08 'overload' 22 05 'mixer' 2A 12 'org.example.player'",
+    "unknown-fields": "30 9601 31 1122334455667788 3A 02 0810 3B 0801 13 14 3C 35 10101010 10 05",
+    "known-of-another-type": "0A 01 05 0D 01020304 15 01020304 1805 33 1009 34 10 05",
+    "end-of-group": "10 05 0C 10 07",
+    "length-beyond-the-end": "1A 05 'four'",
+    "huge-length": "1A FFFFFFFFFFFFFFFFFF01 'x'",
+    "endless-varint": "10 FFFFFFFFFFFFFFFFFFFFFFFF01",
+    "cut-fixed": "31 01020304050607",
+    "field-zero": "00 00",
+    "no-such-type": "36 00",
+    "groups-deep": "33" * 101 + "34" * 101,
+}
+
 
 def from_hex(text):
     """The bytes of a text like "82 01 'abc' F6"."""
@@ -89,9 +105,14 @@ def frame(content):
     return struct.pack("<I", len(content)) + content
 
 
-def main():
-    directory = pathlib.Path(__file__).parent / "corpus" / "frame_decoding"
+def corpus_directory(fuzzer):
+    directory = pathlib.Path(__file__).parent / "corpus" / fuzzer
     directory.mkdir(parents=True, exist_ok=True)
+    return directory
+
+
+def write_frame_decoding():
+    directory = corpus_directory("frame_decoding")
     streams = {name: frame(from_hex(text)) for name, text in REQUESTS.items()}
     streams["all-requests"] = b"".join(streams.values())
     streams["same-message-thrice"] = 3 * streams["send-vocabulary"]
@@ -101,4 +122,11 @@ def main():
         (directory / name).write_bytes(bytes([read_size - 1]) + stream)
 
 
-main()
+def write_metric_records():
+    directory = corpus_directory("metric_record")
+    for name, text in RECORDS.items():
+        (directory / name).write_bytes(from_hex(text))
+
+
+write_frame_decoding()
+write_metric_records()

@@ -1,5 +1,5 @@
 #!/usr/bin/env bash
-# Runs every fuzzer for some time, each from its kept corpus. New inputs that reach new code are left in
+# Runs the fuzzers in turn, each from its kept corpus; they share the time. New inputs that reach new code are left in
 # build/fuzz/corpus/; an input that breaks something is left in build/fuzz/findings/, and the script fails.
 #
 # usage: fuzz.sh SECONDS [--keep]    --keep: adds what was found, minimized, to the kept corpus
@@ -9,7 +9,7 @@ cd "$(dirname "${BASH_SOURCE[0]}")/.."
 seconds=${1:?usage: fuzz.sh SECONDS [--keep]}
 keep=${2:-}
 
-fuzzers=(frame_decoding)
+fuzzers=(frame_decoding metric_record)
 scripts/build.sh fuzz "${fuzzers[@]/%/_fuzzer}"
 mkdir -p build/fuzz/findings
 
@@ -19,7 +19,7 @@ for name in "${fuzzers[@]}"; do
   found=build/fuzz/corpus/$name
   mkdir -p "$found"
   # A frame of the real limit in length is not needed to reach all code.
-  "$fuzzer" -max_total_time="$seconds" -max_len=8192 -timeout=10 -rss_limit_mb=1024 -print_final_stats=1 \
+  "$fuzzer" -max_total_time=$((seconds / ${#fuzzers[@]})) -max_len=8192 -timeout=10 -rss_limit_mb=1024 -print_final_stats=1 \
     -artifact_prefix="build/fuzz/findings/$name-" "$found" "$kept"
   if [[ $keep == --keep ]]; then
     # By edges alone, so that it stays small.

@@ -42,6 +42,9 @@ inline constexpr MessageKey TalReportingMessageKeyVpConfigInputPort{"vp_config_i
 inline constexpr MessageKey TalReportingMessageKeyVpConfigPrimaryVocoder{"vp_config_primary_vocoder"};
 inline constexpr MessageKey TalReportingMessageKeyVpConfigPrimaryVocoderFs{"vp_config_primary_vocoderFs"};
 inline constexpr MessageKey TalReportingMessageKeyIssueType{"issue_type"};
+inline constexpr MessageKey TalReportingMessageKeyRtaidClient{"rtaid_client"};
+inline constexpr MessageKey TalReportingMessageKeyNode{"node"};
+inline constexpr MessageKey TalReportingMessageKeyAnyChannelSilenceSeconds{"any_channel_silence_seconds"};
 
 // Written into derived summaries.
 inline constexpr MessageKey TalReportingMessageKeyVolumeBucketed{"RvSessionVolumeBucketed"};
