@@ -90,6 +90,11 @@ class NothingWanted final : public AnalyticsSink {
   std::unordered_map<std::size_t, bool> known_;
 };
 
+class NoMetrics final : public PlumeMetricSubmitter {
+ public:
+  void postMetric(std::uint32_t, const ProtobufMessage&) override {}
+};
+
 class CalmDevice final : public SystemState {
  public:
   int thermalState() const override { return 0; }
@@ -125,6 +130,7 @@ struct Host {
   NoNotifications notify_center;
   NoProcesses processes;
   NothingWanted analytics;
+  NoMetrics plume_metrics;
   CalmDevice system_state;
   NoDiagnosticLog diagnostic_log;
   NoFlutterRequests flutter_requests;
@@ -138,6 +144,7 @@ struct Host {
                     .notify_center = notify_center,
                     .processes = processes,
                     .analytics = analytics,
+                    .plume_metrics = plume_metrics,
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
                     .flutter_requests = flutter_requests,

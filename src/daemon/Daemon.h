@@ -26,6 +26,7 @@
 #include "platform/linux/settings/DeviceTomlProperties.h"
 #include "platform/linux/settings/TomlSettings.h"
 #include "platform/linux/store/StoreAnalyticsSink.h"
+#include "platform/linux/store/StorePlumeMetricSubmitter.h"
 #include "platform/linux/store/StoreWriter.h"
 #include "platform/linux/system_state/LinuxSystemState.h"
 #include "service/TalReportingService.h"
@@ -63,6 +64,7 @@ class Daemon {
   TomlSettings settings_;
   StoreWriter store_;
   StoreAnalyticsSink analytics_;
+  StorePlumeMetricSubmitter plume_metrics_;
   StoreDurabilityGate durability_gate_;
   LinuxNotifyCenter notify_center_;
   LinuxSystemState system_state_;

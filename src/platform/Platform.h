@@ -7,6 +7,7 @@
 #include "platform/DiagnosticLog.h"
 #include "platform/FlutterRequestService.h"
 #include "platform/NotifyCenter.h"
+#include "platform/PlumeMetricSubmitter.h"
 #include "platform/ProcessTable.h"
 #include "platform/SerialQueue.h"
 #include "platform/SettingsStore.h"
@@ -28,6 +29,7 @@ struct Platform {
   NotifyCenter& notify_center;
   const ProcessTable& processes;
   AnalyticsSink& analytics;
+  PlumeMetricSubmitter& plume_metrics;
   const SystemState& system_state;
   DiagnosticLog& diagnostic_log;
   FlutterRequestService& flutter_requests;

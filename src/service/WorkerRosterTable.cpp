@@ -11,6 +11,7 @@
 #include "workers/derived/TalReportingSessionVolumeMessagesWorker.h"
 #include "workers/diagnostics/TalReportingSessionHoundWorker.h"
 #include "workers/sinks/TalReportingSessionDPWorker.h"
+#include "workers/sinks/TalReportingSessionPlumeWorker.h"
 #include "workers/sinks/TalReportingSessionSummaryJsonFileWorker.h"
 #include "workers/sinks/TalReportingSessionSummaryWorker.h"
 #include "workers/sinks/TalReportingSessionTallyWorker.h"
@@ -46,7 +47,7 @@ std::unique_ptr<WorkerRoster> makeWorkerRoster(const Platform& platform,
   classes.push_back(std::make_unique<TalReportingSessionTallyWorkerClass>(platform.analytics));
   classes.push_back(declining("TalReportingSessionEnergylogWorker", kSingleMessageConsumerFromInit));
   classes.push_back(declining("TalReportingSessionMemoryLogWorker", kConsumerFromInit));
-  classes.push_back(declining("TalReportingSessionPlumeWorker", kSingleMessageConsumerFromInit));
+  classes.push_back(std::make_unique<TalReportingSessionPlumeWorkerClass>());
   classes.push_back(declining("TalReportingSessionDriverSnapshotWorker", kProducer));
   classes.push_back(std::make_unique<TalReportingSessionSystemMonitorWorkerClass>(system_monitor));
   classes.push_back(std::make_unique<TalReportingSessionHoundWorkerClass>());

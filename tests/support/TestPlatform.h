@@ -17,6 +17,7 @@
 #include "support/FakeFlutterRequestService.h"
 #include "support/FakeNotifyCenter.h"
 #include "support/HandDriven.h"
+#include "support/RecordingPlumeMetrics.h"
 
 namespace tal::test {
 
@@ -167,6 +168,7 @@ struct TestPlatform {
   FakeNotifyCenter notify_center;
   FakeProcessTable processes;
   RecordingAnalyticsSink analytics;
+  RecordingPlumeMetrics plume_metrics;
   FakeSystemState system_state;
   FakeDiagnosticLog diagnostic_log;
   FakeFlutterRequestService flutter_requests;
@@ -179,6 +181,7 @@ struct TestPlatform {
                     .notify_center = notify_center,
                     .processes = processes,
                     .analytics = analytics,
+                    .plume_metrics = plume_metrics,
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
                     .flutter_requests = flutter_requests};

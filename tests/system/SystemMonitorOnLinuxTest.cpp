@@ -43,6 +43,7 @@ TEST(SystemMonitorOnLinux, ANewDeviceNameReachesEveryRunningSessionAtItsNotifica
                           .notify_center = notify_center,
                           .processes = host.processes,
                           .analytics = host.analytics,
+                          .plume_metrics = host.plume_metrics,
                           .system_state = host.system_state,
                           .diagnostic_log = host.diagnostic_log,
                           .flutter_requests = host.flutter_requests};

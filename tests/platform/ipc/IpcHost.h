@@ -131,6 +131,7 @@ class IpcHost {
   FakeNotifyCenter notify_center;
   FakeDurabilityGate gate;
   RowPerEvent sink{gate};
+  RecordingPlumeMetrics plume_metrics;
   FakeSystemState system_state;
   FakeDiagnosticLog diagnostic_log;
   FakeFlutterRequestService flutter_requests;
@@ -144,6 +145,7 @@ class IpcHost {
                     .notify_center = notify_center,
                     .processes = processes,
                     .analytics = sink,
+                    .plume_metrics = plume_metrics,
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
                     .flutter_requests = flutter_requests};
