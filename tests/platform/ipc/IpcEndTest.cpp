@@ -135,7 +135,9 @@ TEST_F(IpcEnd, KillTakesEffectAtOnce) {
   const auto client = host_.connect();
   client->ask(Operation::kGetAllReporters, 1);
   host_.blockQueue();
-  client->send(message(1, 1, {}) + request(Operation::kKillService, 2));
+  client->send(message(1, 1, {}));
+  host_.letListenerCatchUp();
+  client->send(request(Operation::kKillService, 2));
   host_.killed.get_future().wait();
   host_.unblockQueue();
   EXPECT_TRUE(host_.numbersCarriedOut().empty()) << "what waited is not carried out";

@@ -98,7 +98,7 @@ TEST_F(IpcFlow, DoesNotServeOneWhoDoesNotRead) {
 
   // Every turn that the queue had has been taken by now.
   const auto other = host_.connect();
-  for (int i = 0; i < 100; ++i) other->ask(Operation::kValidateReporterID, 1, 1);
+  for (int i = 0; i < kRequests; ++i) other->ask(Operation::kValidateReporterID, 1, 1);
   EXPECT_TRUE(host_.numbersCarriedOut().empty());
 
   const std::string first = slow->receive().value();
