@@ -1,21 +1,27 @@
 // What the reporting queue's own work costs, in process: intake of a message,
-// memory of a kept one, stop of a long session, life of a short one.
+// memory of a kept one, stop of a long session, its file, life of a short one.
 
 #include <benchmark/benchmark.h>
 #include <malloc.h>
+#include <unistd.h>
 
 #include <array>
 #include <chrono>
+#include <filesystem>
+#include <fstream>
 #include <memory>
+#include <string>
 #include <unordered_map>
 #include <vector>
 
 #include "core/DictShape.h"
 #include "platform/Platform.h"
+#include "platform/linux/diagnostic_log/LinuxDiagnosticLog.h"
 #include "service/WorkerRosterTable.h"
 #include "session/TalReportingSession.h"
 #include "system/TalReportingSystemMonitor.h"
 #include "workers/diagnostics/TalReportingSessionHoundWorker.h"
+#include "workers/sinks/TalReportingSessionSummaryJsonFileWorker.h"
 
 namespace tal {
 namespace {
@@ -80,11 +86,14 @@ class NoProcesses final : public ProcessTable {
 class NothingWanted final : public AnalyticsSink {
  public:
   bool eventIsWanted(std::string_view name) override {
+    ++asked;
     const auto found = known_.find(std::hash<std::string_view>{}(name));
     if (found == known_.end()) known_.emplace(std::hash<std::string_view>{}(name), false);
     return found != known_.end() && found->second;
   }
   void sendEventWithPayloadProvider(std::string_view, const PayloadProvider&) override {}
+
+  std::size_t asked = 0;
 
  private:
   std::unordered_map<std::size_t, bool> known_;
@@ -132,7 +141,8 @@ struct Host {
   NothingWanted analytics;
   NoMetrics plume_metrics;
   CalmDevice system_state;
-  NoDiagnosticLog diagnostic_log;
+  NoDiagnosticLog no_diagnostic_log;
+  DiagnosticLog& diagnostic_log = no_diagnostic_log;
   NoFlutterRequests flutter_requests;
   NoCaptures captures;
   Platform platform{.reporting_queue = queue,
@@ -157,6 +167,9 @@ struct Host {
   explicit Host(bool internal_build = false) : device(internal_build) {
     system_monitor.initializeWithQueue(queue);
   }
+  explicit Host(DiagnosticLog& log_directory) : device(false), diagnostic_log(log_directory) {
+    system_monitor.initializeWithQueue(queue);
+  }
 
   std::unique_ptr<TalReportingSession> makeSession() {
     return std::make_unique<TalReportingSession>(
@@ -169,6 +182,13 @@ struct Host {
 /// messages; each differs from the one before.
 class MessageMaker {
  public:
+  /// `duration_key` names the ninth value.
+  explicit MessageMaker(MessageKey duration_key = "session_duration") {
+    std::array keys = kKeys;
+    keys[8] = duration_key;
+    shape_ = DictShape::make(keys);
+  }
+
   MessageDict make() {
     ++number_;
     const double now = 1.8e9 + static_cast<double>(number_) * 0.001;
@@ -180,19 +200,19 @@ class MessageMaker {
   }
 
  private:
-  static constexpr MessageKey kKeys[] = {"session_output_running",
-                                         "RvSessionVolume",
-                                         "active_devices",
-                                         "session_selected_format",
-                                         "mFormatID",
-                                         "mChannelsPerFrame",
-                                         "stretch_index",
-                                         "talreporting_timestamp",
-                                         "session_duration",
-                                         "issue_type",
-                                         "smallest_buffer_frame_size",
-                                         "io_cycle"};
-  DictShape::Pointer shape_ = DictShape::make(kKeys);
+  static constexpr std::array<MessageKey, 12> kKeys = {"session_output_running",
+                                                       "RvSessionVolume",
+                                                       "active_devices",
+                                                       "session_selected_format",
+                                                       "mFormatID",
+                                                       "mChannelsPerFrame",
+                                                       "stretch_index",
+                                                       "talreporting_timestamp",
+                                                       "session_duration",
+                                                       "issue_type",
+                                                       "smallest_buffer_frame_size",
+                                                       "io_cycle"};
+  DictShape::Pointer shape_;
   std::int64_t number_ = 0;
 };
 
@@ -250,6 +270,82 @@ void StopAfterMessages(benchmark::State& state) {
   state.counters["bytes_per_kept_message"] = bytes_per_message;
 }
 BENCHMARK(StopAfterMessages)->Arg(10'000)->Arg(100'000)->Arg(1'000'000)->Unit(benchmark::kMillisecond);
+
+// A message a second; every hundredth begins a playing stretch of 50 seconds. "session_duration", which would
+// end one, bears another name here.
+void sendStretches(TalReportingSession& session, MessageMaker& maker, std::int64_t count) {
+  constexpr int kStretchEvery = 100;
+  for (std::int64_t i = 0; i < count; ++i) {
+    MessageDict message = maker.make();
+    message.set("session_output_running", i % kStretchEvery < kStretchEvery / 2);
+    message.set("talreporting_timestamp", 1.8e9 + static_cast<double>(i));
+    session.sendMessage(TalReportingSessionMessage::initWithMessage(
+        std::move(message), AudioEventCategory::kPlayback, AudioEventType::kGeneric));
+  }
+}
+
+void StopAfterStretches(benchmark::State& state) {
+  Host host;
+  MessageMaker maker("seconds_so_far");
+  std::size_t derived = 0;
+  for (auto _ : state) {
+    state.PauseTiming();
+    auto session = host.makeSession();
+    session->setServiceType(AudioServiceType::kLongformaudio);
+    session->start();
+    sendStretches(*session, maker, state.range(0));
+    const std::size_t before = host.analytics.asked;
+    state.ResumeTiming();
+    session->stop();
+    derived = host.analytics.asked - before;
+  }
+  state.counters["derived_messages"] = static_cast<double>(derived);
+}
+BENCHMARK(StopAfterStretches)->Arg(10'000)->Arg(100'000)->Arg(1'000'000)->Unit(benchmark::kMillisecond);
+
+// The number behind a word of /proc/self/status, in mebibytes.
+double mebibytesOf(const std::string& field) {
+  std::ifstream status("/proc/self/status");
+  for (std::string word; status >> word;) {
+    double kibibytes = 0;
+    if (word == field && status >> kibibytes) return kibibytes / 1024;
+  }
+  return 0;
+}
+
+void resetPeakMemory() { std::ofstream("/proc/self/clear_refs") << "5"; }
+
+void SessionFile(benchmark::State& state) {
+  namespace fs = std::filesystem;
+  const fs::path root = fs::temp_directory_path() / ("tal-session-file-" + std::to_string(getpid()));
+  fs::create_directories(root);
+  LinuxDiagnosticLog files(root);
+  Host host(files);
+  MessageMaker maker;
+  auto session = host.makeSession();
+  session->setServiceType(AudioServiceType::kTest);
+  for (std::int64_t i = 0; i < state.range(0); ++i) send(*session, maker);
+  TalReportingSessionSummaryJsonFileWorkerClass file_class;
+  std::uintmax_t bytes = 0;
+  double more_memory = 0;
+  for (auto _ : state) {
+    const auto worker = file_class.initWithSession(*session);
+    resetPeakMemory();
+    const double before = mebibytesOf("VmHWM:");
+    worker->stop();
+    state.PauseTiming();
+    more_memory = std::max(more_memory, mebibytesOf("VmHWM:") - before);
+    for (const auto& entry : fs::recursive_directory_iterator(root)) {
+      if (entry.is_regular_file()) bytes += entry.file_size();
+    }
+    fs::remove_all(root / "Audio");
+    state.ResumeTiming();
+  }
+  state.SetBytesProcessed(static_cast<std::int64_t>(bytes));
+  state.counters["more_MiB_at_peak"] = more_memory;
+  fs::remove_all(root);
+}
+BENCHMARK(SessionFile)->Arg(1'000'000)->Unit(benchmark::kMillisecond);
 
 void SessionLife(benchmark::State& state) {
   Host host;

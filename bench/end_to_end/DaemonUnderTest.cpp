@@ -2,7 +2,6 @@
 
 #include <fcntl.h>
 #include <poll.h>
-#include <signal.h>
 #include <spawn.h>
 #include <sqlite3.h>
 #include <sys/socket.h>
@@ -10,6 +9,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <csignal>
 #include <cstring>
 #include <fstream>
 #include <sstream>
@@ -87,6 +87,7 @@ void DaemonUnderTest::start(const std::string& log_level) {
   const std::string root = root_;
   std::vector<std::string> texts = {TAL_DAEMON_PATH, "--root", root, "--log-level", log_level};
   std::vector<char*> arguments;
+  arguments.reserve(texts.size() + 1);
   for (std::string& text : texts) arguments.push_back(text.data());
   arguments.push_back(nullptr);
   std::string variable = notify.variable();
