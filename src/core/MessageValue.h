@@ -193,7 +193,7 @@ class MessageValue {
   template <typename T>
   T payload() const noexcept {
     T value;
-    std::memcpy(&value, storage_.bytes + kPayloadAt, sizeof value);
+    std::memcpy(&value, storage_.bytes + kPayloadAt, sizeof value);  // NOLINT(bugprone-sizeof-expression)
     return value;
   }
   void setNumber(Form form, std::uint64_t bits) noexcept {

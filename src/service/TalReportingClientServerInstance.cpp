@@ -234,6 +234,7 @@ void TalReportingClientServerInstance::sendMessage(MessageDict message, AudioEve
   }
   for (std::size_t i = 0; i < sessions.size(); ++i) {
     // Every session gets a record of its own; the last one can have the original.
+    // Moved on the last turn only. NOLINTNEXTLINE(bugprone-use-after-move)
     MessageDict own = i + 1 == sessions.size() ? std::move(message) : message;
     sessions[i]->sendMessage(TalReportingSessionMessage::initWithMessage(std::move(own), category, type));
   }

@@ -48,7 +48,7 @@ TEST(MessageValue, TextOfAnyLengthAndOriginIsTheSameText) {
     MessageValue moved = std::move(copy);
     EXPECT_EQ(moved.string(), text);
     EXPECT_EQ(moved, MessageValue::literal(text));
-    EXPECT_EQ(copy.string(), "");
+    EXPECT_EQ(copy.string(), "");  // NOLINT(bugprone-use-after-move)
     copy = moved;
     copy = *&copy;
     EXPECT_EQ(copy, value);

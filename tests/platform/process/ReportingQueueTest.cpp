@@ -77,7 +77,7 @@ TEST(ReportingQueueTest, ThreadBearsTheEndOfTheLabel) {
   ReportingQueue queue(kLabel);
   queue.post([&] { pthread_getname_np(pthread_self(), name.data(), name.size()); });
   queue.stop();
-  EXPECT_STREQ(name.c_str(), "antle.test.queue" + 1);
+  EXPECT_STREQ(name.c_str(), &"antle.test.queue"[1]);
 }
 
 TEST(ReportingQueueTest, TimersRunByDueTimeAndEqualOnesInTheirOrder) {

@@ -18,7 +18,6 @@ namespace {
 using std::chrono_literals::operator""ms;
 using std::chrono_literals::operator""min;
 using testing::ElementsAre;
-using testing::IsEmpty;
 
 // Far beyond what any step takes: a test that waits this long hangs, and says so.
 constexpr auto kPatience = 1min;
@@ -296,7 +295,7 @@ TEST_F(StoreWriterTest, EventsAreStoredAsJsonUnderTheirNames) {
                                       }}});
   EXPECT_TRUE(sink.eventIsWanted("org.a.Start"));
   const MessageDict payload{{"volume", 1.0}, {"device", "Speaker \"1\""}};
-  sink.sendEventWithPayloadProvider("org.a.Start", [&] { return payload; });
+  sink.sendEventWithPayloadProvider("org.a.Start", [&payload] { return payload; });
   sink.sendEventWithPayloadProvider("org.b.Start", [&] { return MessageDict{}; });
   ASSERT_TRUE(store->commitNow(kPatience));
   EXPECT_THAT(test::OtherProgram(storePath()).query("SELECT recorded_at, name, payload FROM events"),
