@@ -39,8 +39,9 @@ NotifyCenter::Registration LinuxNotifyCenter::registerDispatch(std::string_view 
   if (!directory_.canWatch()) return {NotifyStatus::kFailed, kNoToken};
   const std::lock_guard lock(mutex_);
   const Token token = ++last_token_;
-  watchers_[token] =
-      std::shared_ptr<Watcher>(new Watcher{std::string(name), token, queue, std::move(handler)});
+  // An aggregate that cannot be moved. NOLINTNEXTLINE(modernize-make-shared)
+  std::shared_ptr<Watcher> watcher(new Watcher{std::string(name), token, queue, std::move(handler)});
+  watchers_[token] = std::move(watcher);
   return {NotifyStatus::kOk, token};
 }
 
