@@ -129,6 +129,11 @@ class NoCaptures final : public SymptomReporterFactory {
   std::shared_ptr<SymptomReporterService> makeClient(SymptomContext) override { return nullptr; }
 };
 
+class NoTapToKite final : public TapToKiteService {
+ public:
+  void createDraft(KiteDraft, std::optional<std::string>, std::string, Completion) override {}
+};
+
 struct Host {
   NoQueue queue;
   SystemClock clock;
@@ -144,6 +149,7 @@ struct Host {
   NoDiagnosticLog no_diagnostic_log;
   DiagnosticLog& diagnostic_log = no_diagnostic_log;
   NoFlutterRequests flutter_requests;
+  NoTapToKite tap_to_kite;
   NoCaptures captures;
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
@@ -158,6 +164,7 @@ struct Host {
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
                     .flutter_requests = flutter_requests,
+                    .tap_to_kite = tap_to_kite,
                     .symptom_reporters = &captures,
                     .internal_build = TalReportingUtilityIsInternalBuild(device)};
   TalReportingSystemMonitor system_monitor{platform};

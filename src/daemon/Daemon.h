@@ -16,6 +16,7 @@
 #include "platform/linux/diagnostic_log/LinuxDiagnosticLog.h"
 #include "platform/linux/flutter/UnavailableFlutterRequestService.h"
 #include "platform/linux/ipc/IpcListener.h"
+#include "platform/linux/kite/LinuxTapToKiteService.h"
 #include "platform/linux/logging/StderrLogSink.h"
 #include "platform/linux/notify/LinuxNotifyCenter.h"
 #include "platform/linux/process/InstanceLock.h"
@@ -70,6 +71,7 @@ class Daemon {
   LinuxSystemState system_state_;
   LinuxDiagnosticLog diagnostic_log_;
   UnavailableFlutterRequestService flutter_requests_;
+  LinuxTapToKiteService tap_to_kite_;
   // Destroyed after the queue's thread, whose tasks use them, has ended.
   ReportingQueue queue_;
   const Platform platform_;

@@ -13,6 +13,7 @@
 #include "platform/SettingsStore.h"
 #include "platform/SymptomReporterService.h"
 #include "platform/SystemState.h"
+#include "platform/TapToKiteService.h"
 #include "platform/TracePoints.h"
 
 namespace tal {
@@ -33,6 +34,7 @@ struct Platform {
   const SystemState& system_state;
   DiagnosticLog& diagnostic_log;
   FlutterRequestService& flutter_requests;
+  TapToKiteService& tap_to_kite;
   /// Null on a host that takes no captures, as on every customer build.
   SymptomReporterFactory* symptom_reporters = nullptr;
   /// `TalReportingUtilityIsInternalBuild`, asked once.

@@ -10,6 +10,7 @@
 #include "workers/derived/TalReportingSessionInputMessagesWorker.h"
 #include "workers/derived/TalReportingSessionVolumeMessagesWorker.h"
 #include "workers/diagnostics/TalReportingSessionHoundWorker.h"
+#include "workers/diagnostics/TalReportingSessionTapToKiteWorker.h"
 #include "workers/sinks/TalReportingSessionDPWorker.h"
 #include "workers/sinks/TalReportingSessionPlumeWorker.h"
 #include "workers/sinks/TalReportingSessionSummaryJsonFileWorker.h"
@@ -55,7 +56,7 @@ std::unique_ptr<WorkerRoster> makeWorkerRoster(const Platform& platform,
   classes.push_back(std::make_unique<TalReportingSessionSummaryJsonFileWorkerClass>());
   classes.push_back(declining("TalReportingSessionAudioRegistrationWorker", kConsumer));
   classes.push_back(declining("TalReportingSessionRtcWorker", kSingleMessageConsumer));
-  classes.push_back(declining("TalReportingSessionTapToKiteWorker", kSingleMessageConsumer));
+  classes.push_back(std::make_unique<TalReportingSessionTapToKiteWorkerClass>());
   return std::make_unique<WorkerRoster>(std::move(classes), platform.log.session);
 }
 

@@ -33,7 +33,7 @@ BARRIER_REPORTER = -(2**63)
 class Daemon:
     """talreportingd under `--root`, ready to be spoken to once constructed."""
 
-    def __init__(self, root, *arguments, config=None, log="stderr.log", wait_ready=True):
+    def __init__(self, root, *arguments, config=None, log="stderr.log", wait_ready=True, environment=None):
         self.root = pathlib.Path(root)
         self.socket_path = str(self.root / "run/talreporting.sock")
         self.store_path = self.root / "state/store.db"
@@ -47,7 +47,7 @@ class Daemon:
             notify.bind(str(notify_path))
             self.process = subprocess.Popen(
                 [BIN_DIR / "talreportingd", "--root", str(self.root), *arguments],
-                env={**os.environ, "NOTIFY_SOCKET": str(notify_path)}, stdin=subprocess.DEVNULL, stderr=log)
+                env={**os.environ, "NOTIFY_SOCKET": str(notify_path), **(environment or {})}, stdin=subprocess.DEVNULL, stderr=log)
             if wait_ready:
                 self._wait_ready(notify)
 

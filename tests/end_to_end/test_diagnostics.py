@@ -1,12 +1,16 @@
 """What an internal build does for engineers beside its events."""
 
+import json
+import pathlib
+import shutil
+import subprocess
 import unittest
 
-import talreporting
 from tal_harness import DaemonTest, PLAYBACK
 
 IO, ERROR_TYPE = 7, 6
 WORKER_SETTINGS = "settings/org.vantle.talsys.talreporting.toml"
+PROMPTS = {"device.toml": "InternalBuild = true\n", WORKER_SETTINGS: "ParleyInvalidXyBackOffSeconds = 3600.0\n"}
 OVERLOAD = {"smallest_buffer_frame_size": 512, "io_cycle": 9}
 
 
@@ -22,14 +26,19 @@ class CustomerBuild(DaemonTest):
         self.assertFalse((self.daemon.root / "run/notify/org.vantle.talsys.dropped-flutter").exists())
 
 
+def send_invalid_coordinates(client, reporter):
+    """What calls for a prompt: a message that arms the worker, and one of invalid coordinates six seconds later."""
+    for seconds, key in ((1, "ordinary"), (7, "vmox_invalid_x")):
+        client.send_message({"talreporting_timestamp": 1.8e9 + seconds, key: 1}, PLAYBACK, 0, [reporter])
+
+
 class InternalBuild(DaemonTest):
     config = {"device.toml": "InternalBuild = true\n",
               WORKER_SETTINGS: "enable_flutter = true\nio_buffer_size = 256\nwait_time = 1000.0\n"}
 
-    def started(self, reporter, service="generic"):
-        client = self.connect()
+    def started(self, reporter, daemon=None):
+        client = self.connect(daemon)
         client.create_reporting_session(reporter)
-        client.set_service_type(reporter, talreporting.SERVICE_TYPES[service])
         client.start_reporting_session(reporter)
         return client
 
@@ -41,6 +50,58 @@ class InternalBuild(DaemonTest):
         self.assertFalse(announced.exists())
         client.send_message(OVERLOAD, IO, ERROR_TYPE, [7])
         self.assertEqual(announced.read_text(), "0")
+
+    def test_invalid_coordinates_leave_one_draft_in_the_back_off_time(self):
+        root = self.make_root(self.addCleanup)
+        for reporter in (7, 8):  # the second time a daemon that has been started anew
+            daemon = self.start_daemon(root=root, config=PROMPTS,
+                                       environment={"DBUS_SESSION_BUS_ADDRESS": "unix:path=/nowhere"})
+            send_invalid_coordinates(self.started(reporter, daemon=daemon), reporter)
+            self.assertEqual(daemon.terminate(), 0)
+        drafts = sorted((daemon.root / "log/Audio/Drafts").iterdir())
+        self.assertEqual([draft.suffix for draft in drafts], [".json", ".md"])
+        draft = json.loads(drafts[0].read_text())
+        self.assertEqual(draft["title"], "Invalid x/y coordinates during a Parley call (TTK)")
+        self.assertEqual(draft["component"]["identifier"], 1084682)
+        self.assertIn(f"`{draft['process_name']}`", drafts[1].read_text())
+        self.assertEqual([draft.stat().st_mode & 0o007 for draft in drafts], [0, 0])
+
+    @unittest.skipUnless(shutil.which("dbus-daemon") and shutil.which("busctl"), "no dbus-daemon or no busctl")
+    def test_a_draft_is_shown_on_the_desktop(self):
+        root = self.make_root(self.addCleanup)
+        address = self.start_session_bus(root)
+        monitor = self.start("busctl", f"--address={address}", "monitor", "--json=short", stdout=subprocess.PIPE,
+                             stderr=subprocess.PIPE)
+        while b"Monitoring" not in monitor.stderr.readline():
+            self.assertIsNone(monitor.poll())
+        daemon = self.start_daemon(root=root, config=PROMPTS, environment={"DBUS_SESSION_BUS_ADDRESS": address})
+        send_invalid_coordinates(self.started(7, daemon=daemon), 7)
+        calls = (json.loads(line) for line in monitor.stdout)
+        arguments = next(call["payload"]["data"] for call in calls if call.get("member") == "Notify")
+        self.assertEqual((arguments[0], arguments[3]),
+                         ("talreportingd", "Invalid x/y coordinates during a Parley call (TTK)"))
+        self.assertIn("log/Audio/Drafts/", arguments[4])
+        self.assertEqual(daemon.terminate(), 0)
+
+    def start(self, *command, **options):
+        process = subprocess.Popen(command, stdin=subprocess.DEVNULL, **options)
+
+        def end():
+            process.kill()
+            process.communicate()
+
+        self.addCleanup(end)
+        return process
+
+    def start_session_bus(self, root):
+        """A bus with nobody on it, and nobody whom it would start."""
+        (pathlib.Path(root) / "bus.conf").write_text(
+            f"<busconfig><type>session</type><listen>unix:path={root}/bus</listen><policy context='default'>"
+            "<allow send_destination='*' eavesdrop='true'/><allow eavesdrop='true'/><allow own='*'/></policy>"
+            "</busconfig>")
+        bus = self.start("dbus-daemon", f"--config-file={root}/bus.conf", "--nofork", "--print-address=1",
+                         stdout=subprocess.PIPE, stderr=subprocess.DEVNULL)
+        return bus.stdout.readline().decode().strip()
 
 
 if __name__ == "__main__":

@@ -16,6 +16,7 @@
 #include "platform/Platform.h"
 #include "support/FakeFlutterRequestService.h"
 #include "support/FakeNotifyCenter.h"
+#include "support/FakeTapToKiteService.h"
 #include "support/HandDriven.h"
 #include "support/RecordingPlumeMetrics.h"
 
@@ -172,6 +173,7 @@ struct TestPlatform {
   FakeSystemState system_state;
   FakeDiagnosticLog diagnostic_log;
   FakeFlutterRequestService flutter_requests;
+  FakeTapToKiteService tap_to_kite;
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
                     .log = channels,
@@ -184,7 +186,8 @@ struct TestPlatform {
                     .plume_metrics = plume_metrics,
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
-                    .flutter_requests = flutter_requests};
+                    .flutter_requests = flutter_requests,
+                    .tap_to_kite = tap_to_kite};
 };
 
 }  // namespace tal::test

@@ -46,7 +46,8 @@ TEST(SystemMonitorOnLinux, ANewDeviceNameReachesEveryRunningSessionAtItsNotifica
                           .plume_metrics = host.plume_metrics,
                           .system_state = host.system_state,
                           .diagnostic_log = host.diagnostic_log,
-                          .flutter_requests = host.flutter_requests};
+                          .flutter_requests = host.flutter_requests,
+                          .tap_to_kite = host.tap_to_kite};
   write_name("one");
   TalReportingSystemMonitor monitor(platform);
   monitor.initializeWithQueue(queue);

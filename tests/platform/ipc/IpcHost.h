@@ -135,6 +135,7 @@ class IpcHost {
   FakeSystemState system_state;
   FakeDiagnosticLog diagnostic_log;
   FakeFlutterRequestService flutter_requests;
+  FakeTapToKiteService tap_to_kite;
   ReportingQueue queue{"test"};
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
@@ -148,7 +149,8 @@ class IpcHost {
                     .plume_metrics = plume_metrics,
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
-                    .flutter_requests = flutter_requests};
+                    .flutter_requests = flutter_requests,
+                    .tap_to_kite = tap_to_kite};
   TalReportingSystemMonitor system_monitor{platform};
   std::unique_ptr<WorkerRoster> roster = makeWorkerRoster(platform, system_monitor);
   std::promise<void> killed;
