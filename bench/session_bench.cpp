@@ -104,6 +104,11 @@ class NoMetrics final : public PlumeMetricSubmitter {
   void postMetric(std::uint32_t, const ProtobufMessage&) override {}
 };
 
+class NoEnergylog final : public EnergylogSink {
+ public:
+  void logRegisteredEvent(std::int32_t, std::string_view, const MessageDict&) override {}
+};
+
 class CalmDevice final : public SystemState {
  public:
   int thermalState() const override { return 0; }
@@ -145,6 +150,7 @@ struct Host {
   NoProcesses processes;
   NothingWanted analytics;
   NoMetrics plume_metrics;
+  NoEnergylog energylog;
   CalmDevice system_state;
   NoDiagnosticLog no_diagnostic_log;
   DiagnosticLog& diagnostic_log = no_diagnostic_log;
@@ -161,6 +167,7 @@ struct Host {
                     .processes = processes,
                     .analytics = analytics,
                     .plume_metrics = plume_metrics,
+                    .energylog = energylog,
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
                     .flutter_requests = flutter_requests,

@@ -27,6 +27,7 @@
 #include "platform/linux/settings/DeviceTomlProperties.h"
 #include "platform/linux/settings/TomlSettings.h"
 #include "platform/linux/store/StoreAnalyticsSink.h"
+#include "platform/linux/store/StoreEnergylogSink.h"
 #include "platform/linux/store/StorePlumeMetricSubmitter.h"
 #include "platform/linux/store/StoreWriter.h"
 #include "platform/linux/system_state/LinuxSystemState.h"
@@ -66,6 +67,7 @@ class Daemon {
   StoreWriter store_;
   StoreAnalyticsSink analytics_;
   StorePlumeMetricSubmitter plume_metrics_;
+  StoreEnergylogSink energylog_;
   StoreDurabilityGate durability_gate_;
   LinuxNotifyCenter notify_center_;
   LinuxSystemState system_state_;

@@ -5,6 +5,7 @@
 #include "platform/Clock.h"
 #include "platform/DeviceProperties.h"
 #include "platform/DiagnosticLog.h"
+#include "platform/EnergylogSink.h"
 #include "platform/FlutterRequestService.h"
 #include "platform/NotifyCenter.h"
 #include "platform/PlumeMetricSubmitter.h"
@@ -31,6 +32,7 @@ struct Platform {
   const ProcessTable& processes;
   AnalyticsSink& analytics;
   PlumeMetricSubmitter& plume_metrics;
+  EnergylogSink& energylog;
   const SystemState& system_state;
   DiagnosticLog& diagnostic_log;
   FlutterRequestService& flutter_requests;

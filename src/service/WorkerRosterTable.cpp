@@ -12,6 +12,7 @@
 #include "workers/diagnostics/TalReportingSessionHoundWorker.h"
 #include "workers/diagnostics/TalReportingSessionTapToKiteWorker.h"
 #include "workers/sinks/TalReportingSessionDPWorker.h"
+#include "workers/sinks/TalReportingSessionEnergylogWorker.h"
 #include "workers/sinks/TalReportingSessionPlumeWorker.h"
 #include "workers/sinks/TalReportingSessionSummaryJsonFileWorker.h"
 #include "workers/sinks/TalReportingSessionSummaryWorker.h"
@@ -28,8 +29,6 @@ constexpr Traits kProducer{.is_producer = true};
 constexpr Traits kConsumer{.is_consumer = true};
 constexpr Traits kConsumerFromInit{.is_consumer = true, .start_on_init = true};
 constexpr Traits kSingleMessageConsumer{.is_consumer = true, .handle_single_message_session = true};
-constexpr Traits kSingleMessageConsumerFromInit{
-    .is_consumer = true, .start_on_init = true, .handle_single_message_session = true};
 
 std::unique_ptr<TalReportingSessionWorkerClass> declining(std::string_view name, Traits traits) {
   return std::make_unique<DecliningWorkerClass>(name, traits);
@@ -46,7 +45,7 @@ std::unique_ptr<WorkerRoster> makeWorkerRoster(const Platform& platform,
   classes.push_back(std::make_unique<TalReportingSessionSummaryWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionInputMessagesWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionTallyWorkerClass>(platform.analytics));
-  classes.push_back(declining("TalReportingSessionEnergylogWorker", kSingleMessageConsumerFromInit));
+  classes.push_back(std::make_unique<TalReportingSessionEnergylogWorkerClass>());
   classes.push_back(declining("TalReportingSessionMemoryLogWorker", kConsumerFromInit));
   classes.push_back(std::make_unique<TalReportingSessionPlumeWorkerClass>());
   classes.push_back(declining("TalReportingSessionDriverSnapshotWorker", kProducer));

@@ -1,5 +1,6 @@
-"""What leaves the daemon besides events: metric records that protocol-buffers tools decode."""
+"""What leaves the daemon besides events: metric records that protocol-buffers tools decode, and the power log."""
 
+import json
 import pathlib
 import re
 import shutil
@@ -7,11 +8,12 @@ import signal
 import subprocess
 import unittest
 
+import talreporting
 from tal_harness import PATIENCE_SECONDS, PLAYBACK, DaemonTest
 
 PROTO = pathlib.Path(__file__).parents[2] / "docs/plumemetrics.proto"
 AUDIO_ISSUE_DETECTED = 0x5B0003
-ISSUE_DETECTOR = 7
+ISSUE_DETECTOR, ENERGYLOG = 7, 8
 
 
 def protoc(verb, data):
@@ -49,9 +51,27 @@ class Records(DaemonTest):
         client = self.connect(daemon, durable=True)
         for number in range(20):
             client.send_message({"any_channel_silence_seconds": number}, PLAYBACK, ISSUE_DETECTOR)
+            client.send_message({"EngineOnTime": number}, PLAYBACK, ENERGYLOG)
         self.assertEqual(daemon.kill(), -signal.SIGKILL)
         records = [record for (record,) in daemon.rows("SELECT record FROM metrics ORDER BY id")]
         self.assertEqual([record[1] for record in records], list(range(20)))
+        durations = daemon.rows("SELECT class, name, payload ->> '$.EngineOnDuration' FROM energylog ORDER BY id")
+        self.assertEqual(durations, [(28, "Vidra_Haptics_EngineOnDuration", number) for number in range(20)])
+
+    def test_the_power_log_names_the_application(self):
+        client = self.connect()
+        client.create_reporting_session(7)
+        client.set_service_type(7, talreporting.SERVICE_TYPES["haptics"])
+        client.set_configuration(7, {"HostApplicationDisplayID": "game"})
+        client.send_message({"EngineOnTime": 1.5, "EngineState": "EngineOn", "talreporting_timestamp": 2e9,
+                             "Haptic_Active_Hardware_Time_Seconds": 2}, PLAYBACK, ENERGYLOG, [7])
+        self.daemon.settle()
+        rows = self.daemon.rows("SELECT name, payload FROM energylog ORDER BY id")
+        common = {"ApplicationName": "game", "TimestampEnd": 2e9}
+        self.assertEqual([(name, json.loads(payload)) for name, payload in rows],
+                         [("Vidra_Haptics_EngineOnDuration", {"EngineOnDuration": 1.5, **common}),
+                          ("Vidra_Haptics_ClientStatus", {"Status": 1, **common}),
+                          ("LeakedHapticsSessionInfo", {"Haptic_Active_Hardware_Time_Seconds": 2})])
 
 
 if __name__ == "__main__":

@@ -18,6 +18,7 @@
 #include "support/FakeNotifyCenter.h"
 #include "support/FakeTapToKiteService.h"
 #include "support/HandDriven.h"
+#include "support/RecordingEnergylog.h"
 #include "support/RecordingPlumeMetrics.h"
 
 namespace tal::test {
@@ -170,6 +171,7 @@ struct TestPlatform {
   FakeProcessTable processes;
   RecordingAnalyticsSink analytics;
   RecordingPlumeMetrics plume_metrics;
+  RecordingEnergylog energylog;
   FakeSystemState system_state;
   FakeDiagnosticLog diagnostic_log;
   FakeFlutterRequestService flutter_requests;
@@ -184,6 +186,7 @@ struct TestPlatform {
                     .processes = processes,
                     .analytics = analytics,
                     .plume_metrics = plume_metrics,
+                    .energylog = energylog,
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
                     .flutter_requests = flutter_requests,

@@ -44,6 +44,7 @@ TEST(SystemMonitorOnLinux, ANewDeviceNameReachesEveryRunningSessionAtItsNotifica
                           .processes = host.processes,
                           .analytics = host.analytics,
                           .plume_metrics = host.plume_metrics,
+                          .energylog = host.energylog,
                           .system_state = host.system_state,
                           .diagnostic_log = host.diagnostic_log,
                           .flutter_requests = host.flutter_requests,

@@ -132,6 +132,7 @@ class IpcHost {
   FakeDurabilityGate gate;
   RowPerEvent sink{gate};
   RecordingPlumeMetrics plume_metrics;
+  RecordingEnergylog energylog;
   FakeSystemState system_state;
   FakeDiagnosticLog diagnostic_log;
   FakeFlutterRequestService flutter_requests;
@@ -147,6 +148,7 @@ class IpcHost {
                     .processes = processes,
                     .analytics = sink,
                     .plume_metrics = plume_metrics,
+                    .energylog = energylog,
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
                     .flutter_requests = flutter_requests,
