@@ -21,9 +21,13 @@ std::string listText(const std::vector<ReporterID>& reporter_ids) {
 
 }  // namespace
 
-TalReportingClientServerInstance::TalReportingClientServerInstance(std::int32_t process_identifier,
-                                                                   TalReportingService& service)
-    : process_identifier_(process_identifier), delegate_(service), platform_(service.platform()) {
+TalReportingClientServerInstance::TalReportingClientServerInstance(
+    std::int32_t process_identifier, TalReportingService& service,
+    std::shared_ptr<const ClientIdentity> identity)
+    : process_identifier_(process_identifier),
+      identity_(std::move(identity)),
+      delegate_(service),
+      platform_(service.platform()) {
   TAL_LOG(log(), "new client with pid ", process_identifier_);
 }
 
@@ -48,8 +52,8 @@ TalReportingSession* TalReportingClientServerInstance::findAny(ReporterID report
 }
 
 std::unique_ptr<TalReportingSession> TalReportingClientServerInstance::makeSession(ReporterID reporter_id) {
-  TalReportingSession::Options options{.reporter_id = reporter_id,
-                                       .process_identifiers = {process_identifier_}};
+  TalReportingSession::Options options{
+      .reporter_id = reporter_id, .process_identifiers = {process_identifier_}, .client_identity = identity_};
   return std::make_unique<TalReportingSession>(std::move(options), platform_, delegate_.roster(),
                                                kept_bytes_);
 }

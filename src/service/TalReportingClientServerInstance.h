@@ -14,6 +14,7 @@
 
 #include "core/EventVocabulary.h"
 #include "core/MessageDict.h"
+#include "platform/ClientIdentity.h"
 #include "session/TalReportingSession.h"
 
 namespace tal {
@@ -44,7 +45,9 @@ class TalReportingClientServerInstance
   using SessionMap = std::map<ReporterID, std::unique_ptr<TalReportingSession>>;
 
   /// Held by a shared pointer. `service` (the delegate) outlives the instance.
-  TalReportingClientServerInstance(std::int32_t process_identifier, TalReportingService& service);
+  /// Without an identity the client's sessions may open no files.
+  TalReportingClientServerInstance(std::int32_t process_identifier, TalReportingService& service,
+                                   std::shared_ptr<const ClientIdentity> identity = nullptr);
   TalReportingClientServerInstance(const TalReportingClientServerInstance&) = delete;
   TalReportingClientServerInstance& operator=(const TalReportingClientServerInstance&) = delete;
   ~TalReportingClientServerInstance();
@@ -104,6 +107,7 @@ class TalReportingClientServerInstance
   void connectionEnded();
 
   const std::int32_t process_identifier_;
+  const std::shared_ptr<const ClientIdentity> identity_;
   TalReportingService& delegate_;
   const Platform& platform_;
   std::optional<double> client_start_date_;

@@ -49,10 +49,12 @@ TalReportingService::TalReportingService(const Platform& platform, const WorkerR
 
 TalReportingService::~TalReportingService() { TAL_LOG(log(), "destroying service"); }
 
-TalReportingService::Client TalReportingService::shouldAcceptNewConnection(std::int32_t process_identifier,
-                                                                           std::string_view connection) {
+TalReportingService::Client TalReportingService::shouldAcceptNewConnection(
+    std::int32_t process_identifier, std::string_view connection,
+    std::shared_ptr<const ClientIdentity> identity) {
   TAL_LOG(log(), "newConnection: ", connection);
-  auto client = std::make_shared<TalReportingClientServerInstance>(process_identifier, *this);
+  auto client =
+      std::make_shared<TalReportingClientServerInstance>(process_identifier, *this, std::move(identity));
   platform_.reporting_queue.post([this, client] {
     clients_.push_back(client);
     client->setClientStartDate(platform_.clock.secondsSince1970());

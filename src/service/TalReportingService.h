@@ -46,8 +46,10 @@ class TalReportingService {
   /// rest of its joining to the reporting queue. The transport holds the client
   /// until the connection ends, then calls the invalidation handler (where the
   /// peer broke off in mid-frame, the interruption handler first) and lets go.
-  /// `connection` is how log lines call it.
-  Client shouldAcceptNewConnection(std::int32_t process_identifier, std::string_view connection);
+  /// `connection` is how log lines call it; `identity` decides which files the
+  /// client may have opened, none when it is null.
+  Client shouldAcceptNewConnection(std::int32_t process_identifier, std::string_view connection,
+                                   std::shared_ptr<const ClientIdentity> identity = nullptr);
 
   /// The transport's thread: the connection broke off.
   void interruptionHandler(const std::weak_ptr<TalReportingClientServerInstance>& client);

@@ -20,6 +20,7 @@ TalReportingSession::TalReportingSession(Options options, const Platform& platfo
       owner_bytes_(owner_bytes),
       reporter_id_(options.reporter_id),
       process_identifiers_(std::move(options.process_identifiers)),
+      client_identity_(std::move(options.client_identity)),
       kept_(owner_bytes) {
   startWorkersFromClasses(roster_.startOnInitClasses());
   TAL_LOG_INFO(log(), "created reporting session for ID: ", reporter_id_);

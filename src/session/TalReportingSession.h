@@ -14,6 +14,7 @@
 #include "core/EventVocabulary.h"
 #include "core/MessageDict.h"
 #include "core/TalReportingSessionMessage.h"
+#include "platform/ClientIdentity.h"
 #include "platform/Platform.h"
 #include "session/KeptMessages.h"
 #include "session/TalReportingSessionWorker.h"
@@ -38,6 +39,8 @@ class TalReportingSession {
     ReporterID reporter_id = 0;
     /// The owning processes; the first is the owner.
     std::vector<std::int32_t> process_identifiers;
+    /// Who the client is to the host; null for nobody, who has no rights.
+    std::shared_ptr<const ClientIdentity> client_identity = nullptr;
   };
 
   /// `platform`, `roster` and `owner_bytes` outlive the session. `owner_bytes` is
@@ -94,6 +97,7 @@ class TalReportingSession {
   const MessageDict& configuration() const { return configuration_; }
   ReporterID reporterID() const { return reporter_id_; }
   const std::vector<std::int32_t>& processIdentifiers() const { return process_identifiers_; }
+  const ClientIdentity* clientIdentity() const { return client_identity_.get(); }
   const std::optional<std::string>& clientProcessName() const { return client_process_name_; }
   void setClientProcessName(std::optional<std::string> name) { client_process_name_ = std::move(name); }
   /// Every non-redundant message, and the start and stop state messages. In time
@@ -136,6 +140,7 @@ class TalReportingSession {
 
   ReporterID reporter_id_;
   std::vector<std::int32_t> process_identifiers_;
+  std::shared_ptr<const ClientIdentity> client_identity_;
   std::optional<std::string> client_process_name_;
   bool started_ = false;
   bool is_single_message_session_ = false;

@@ -5,9 +5,10 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstddef>
 #include <system_error>
 #include <utility>
+
+#include "platform/linux/diagnostic_log/BufferedFile.h"
 
 namespace tal {
 
@@ -17,55 +18,8 @@ namespace fs = std::filesystem;
 
 constexpr mode_t kOpenToEveryone = 0777;
 constexpr mode_t kReadByEveryone = 0644;
-// Large enough that the disk is asked rarely, small beside what a daemon holds.
-constexpr std::size_t kBufferBytes = std::size_t{256} << 10;
 
 std::string reasonOf(int error) { return std::generic_category().message(error); }
-
-class BufferedFile final : public DiagnosticFile {
- public:
-  explicit BufferedFile(int descriptor) : descriptor_(descriptor) { buffer_.reserve(kBufferBytes); }
-  BufferedFile(const BufferedFile&) = delete;
-  BufferedFile& operator=(const BufferedFile&) = delete;
-  ~BufferedFile() override {
-    if (descriptor_ >= 0) static_cast<void>(close());
-  }
-
-  Error write(std::string_view bytes) override {
-    if (buffer_.size() + bytes.size() > kBufferBytes) {
-      if (Error error = flush()) return error;
-    }
-    if (bytes.size() > kBufferBytes) return writeAll(bytes);
-    buffer_ += bytes;
-    return std::nullopt;
-  }
-
-  Error close() override {
-    Error error = flush();
-    if (::close(std::exchange(descriptor_, -1)) != 0 && !error) error = reasonOf(errno);
-    return error;
-  }
-
- private:
-  Error flush() {
-    Error error = writeAll(buffer_);
-    buffer_.clear();
-    return error;
-  }
-
-  Error writeAll(std::string_view bytes) const {
-    while (!bytes.empty()) {
-      const ssize_t written = ::write(descriptor_, bytes.data(), bytes.size());
-      if (written < 0 && errno == EINTR) continue;
-      if (written < 0) return reasonOf(errno);
-      bytes.remove_prefix(static_cast<std::size_t>(written));
-    }
-    return std::nullopt;
-  }
-
-  int descriptor_;
-  std::string buffer_;
-};
 
 /// A directory that is held open, so that nobody can put another in its place.
 class Directory {

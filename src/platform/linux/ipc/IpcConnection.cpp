@@ -20,6 +20,15 @@ std::string describe(const PeerCredentials& peer) {
          std::to_string(peer.user);
 }
 
+// Null where the kernel did not tell.
+std::shared_ptr<const ClientIdentity> identityOf(const PeerCredentials& peer) {
+  if (peer.user == PeerCredentials{}.user) return nullptr;
+  return std::make_shared<const ClientIdentity>(ClientIdentity{
+      .user = peer.user,
+      .group = peer.group,
+      .supplementary_groups = {peer.supplementary_groups.begin(), peer.supplementary_groups.end()}});
+}
+
 // True when the peer has closed both directions: nobody reads replies any more.
 bool hungUp(int socket) {
   pollfd state{.fd = socket, .events = 0, .revents = 0};
@@ -54,7 +63,8 @@ IpcConnection::IpcConnection(Socket socket, PeerCredentials peer, std::uint32_t 
       splitter_(max_frame_bytes) {}
 
 void IpcConnection::start() {
-  client_ = context_.service.shouldAcceptNewConnection(peer_.process_identifier, describe(peer_));
+  client_ = context_.service.shouldAcceptNewConnection(peer_.process_identifier, describe(peer_),
+                                                       identityOf(peer_));
   makeRunner();
   waitReadable();
 }

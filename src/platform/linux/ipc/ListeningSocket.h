@@ -8,7 +8,7 @@
 #include <filesystem>
 #include <optional>
 
-#include "platform/linux/ipc/FileDescriptor.h"
+#include "platform/linux/process/FileDescriptor.h"
 
 namespace tal {
 

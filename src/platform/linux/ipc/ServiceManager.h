@@ -5,7 +5,7 @@
 
 #include <optional>
 
-#include "platform/linux/ipc/FileDescriptor.h"
+#include "platform/linux/process/FileDescriptor.h"
 
 namespace tal {
 
