@@ -16,6 +16,7 @@
 #include "platform/SystemState.h"
 #include "platform/TapToKiteService.h"
 #include "platform/TracePoints.h"
+#include "platform/TracingPlatform.h"
 
 namespace tal {
 
@@ -41,6 +42,8 @@ struct Platform {
   SymptomReporterFactory* symptom_reporters = nullptr;
   /// `TalReportingUtilityIsInternalBuild`, asked once.
   bool internal_build = false;
+  /// Null on a host that records no performance traces.
+  const TracingPlatform* tracing = nullptr;
 };
 
 /// The label that the host's tools show for the reporting queue's thread.

@@ -6,6 +6,7 @@
 
 #include "session/DecliningWorkerClass.h"
 #include "system/TalReportingSessionSystemMonitorWorker.h"
+#include "tracing/TalReportingSessionTraceWorker.h"
 #include "workers/derived/TalReportingSessionHuddleMessagesWorker.h"
 #include "workers/derived/TalReportingSessionInputMessagesWorker.h"
 #include "workers/derived/TalReportingSessionVolumeMessagesWorker.h"
@@ -34,12 +35,17 @@ std::unique_ptr<TalReportingSessionWorkerClass> declining(std::string_view name,
   return std::make_unique<DecliningWorkerClass>(name, traits);
 }
 
+std::unique_ptr<TalReportingSessionWorkerClass> traceWorkerClass(const Platform& platform) {
+  if (!platform.tracing) return declining("TalReportingSessionTraceWorker", kNeither);
+  return std::make_unique<TalReportingSessionTraceWorkerClass>(*platform.tracing);
+}
+
 }  // namespace
 
 std::unique_ptr<WorkerRoster> makeWorkerRoster(const Platform& platform,
                                                const TalReportingSystemMonitor& system_monitor) {
   std::vector<std::unique_ptr<TalReportingSessionWorkerClass>> classes;
-  classes.push_back(declining("TalReportingSessionTraceWorker", kNeither));
+  classes.push_back(traceWorkerClass(platform));
   classes.push_back(std::make_unique<TalReportingSessionVolumeMessagesWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionHuddleMessagesWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionSummaryWorkerClass>());
