@@ -31,6 +31,7 @@
 #include "platform/linux/store/StorePlumeMetricSubmitter.h"
 #include "platform/linux/store/StoreWriter.h"
 #include "platform/linux/system_state/LinuxSystemState.h"
+#include "platform/linux/tracing/LinuxTracing.h"
 #include "service/TalReportingService.h"
 #include "session/WorkerRoster.h"
 #include "system/TalReportingSystemMonitor.h"
@@ -74,6 +75,7 @@ class Daemon {
   LinuxDiagnosticLog diagnostic_log_;
   UnavailableFlutterRequestService flutter_requests_;
   LinuxTapToKiteService tap_to_kite_;
+  LinuxTracing tracing_;
   // Destroyed after the queue's thread, whose tasks use them, has ended.
   ReportingQueue queue_;
   const Platform platform_;

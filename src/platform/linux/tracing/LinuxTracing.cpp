@@ -1,0 +1,36 @@
+#include "platform/linux/tracing/LinuxTracing.h"
+
+#include <system_error>
+
+#include "platform/linux/tracing/RealSemaphore.h"
+
+namespace tal {
+
+namespace {
+
+namespace fs = std::filesystem;
+
+// Everything is found from where this program lies, so that an installation can be moved.
+fs::path beside(const char* relative) {
+  std::error_code error;
+  const fs::path program = fs::read_symlink("/proc/self/exe", error);
+  return (program.parent_path() / relative).lexically_normal();
+}
+
+}  // namespace
+
+LinuxTracing::LinuxTracing(const Options& options)
+    : perftrail_({.helper = beside("../" TAL_LIBEXEC_DIR "/talreporting/tal-perftrail"),
+                  .home = options.runtime_directory / "lttng",
+                  .diagnostic_log = options.diagnostic_log,
+                  .clock = options.clock}),
+      skein_(beside("../" TAL_LIB_DIR "/talreporting"), options.log),
+      client_files_(options.log_directory),
+      platform_{.perftrail = perftrail_,
+                .skein = skein_,
+                .perf_data = perf_data_,
+                .client_files = client_files_,
+                .property_lists = property_lists_,
+                .make_semaphore = [] { return std::make_unique<RealSemaphore>(); }} {}
+
+}  // namespace tal
