@@ -21,6 +21,10 @@ std::variant<DaemonOptions, ExitStatus> parseCommandLine(int argument_count, con
   app.add_option("--runtime-dir", directories.runtime, "The socket and notifications")->type_name("DIR");
   app.add_option("--log-dir", directories.log, "Diagnostic logs")->type_name("DIR");
 
+  app.add_option("--host-root", options.host_root,
+                 "Read /proc and /sys of the device below DIR: a recorded device, or a mounted host")
+      ->type_name("DIR");
+
   const std::map<std::string, LogLevel> levels = {{"default", LogLevel::kDefault},
                                                   {"info", LogLevel::kInfo},
                                                   {"debug", LogLevel::kDebug},

@@ -1,5 +1,6 @@
 #pragma once
 
+#include <filesystem>
 #include <string>
 #include <variant>
 
@@ -12,6 +13,8 @@ struct DaemonOptions {
   enum class LogTo { kStderr, kJournal };
 
   DirectoryOptions directories;
+  /// Where /proc and /sys of the device are looked for.
+  std::filesystem::path host_root = "/";
   LogLevel log_level = LogLevel::kDefault;
   LogTo log_to = LogTo::kStderr;
 };

@@ -14,6 +14,7 @@
 #include "daemon/StoreDurabilityGate.h"
 #include "platform/Platform.h"
 #include "platform/linux/diagnostic_log/LinuxDiagnosticLog.h"
+#include "platform/linux/driver_stats/LinuxDriverStatsFeed.h"
 #include "platform/linux/flutter/UnavailableFlutterRequestService.h"
 #include "platform/linux/ipc/IpcListener.h"
 #include "platform/linux/kite/LinuxTapToKiteService.h"
@@ -73,6 +74,7 @@ class Daemon {
   LinuxNotifyCenter notify_center_;
   LinuxSystemState system_state_;
   LinuxDiagnosticLog diagnostic_log_;
+  LinuxDriverStatsFeed driver_stats_;
   UnavailableFlutterRequestService flutter_requests_;
   LinuxTapToKiteService tap_to_kite_;
   LinuxTracing tracing_;

@@ -5,6 +5,7 @@
 #include "platform/Clock.h"
 #include "platform/DeviceProperties.h"
 #include "platform/DiagnosticLog.h"
+#include "platform/DriverStatsFeed.h"
 #include "platform/EnergylogSink.h"
 #include "platform/FlutterRequestService.h"
 #include "platform/NotifyCenter.h"
@@ -36,6 +37,7 @@ struct Platform {
   EnergylogSink& energylog;
   const SystemState& system_state;
   DiagnosticLog& diagnostic_log;
+  DriverStatsFeed& driver_stats;
   FlutterRequestService& flutter_requests;
   TapToKiteService& tap_to_kite;
   /// Null on a host that takes no captures, as on every customer build.

@@ -4,6 +4,7 @@
 #include <utility>
 #include <vector>
 
+#include "drivers/TalReportingSessionDriverSnapshotWorker.h"
 #include "session/DecliningWorkerClass.h"
 #include "system/TalReportingSessionSystemMonitorWorker.h"
 #include "tracing/TalReportingSessionTraceWorker.h"
@@ -26,7 +27,6 @@ namespace {
 using Traits = TalReportingSessionWorkerClass::Traits;
 
 constexpr Traits kNeither{};
-constexpr Traits kProducer{.is_producer = true};
 constexpr Traits kConsumer{.is_consumer = true};
 constexpr Traits kConsumerFromInit{.is_consumer = true, .start_on_init = true};
 constexpr Traits kSingleMessageConsumer{.is_consumer = true, .handle_single_message_session = true};
@@ -54,7 +54,7 @@ std::unique_ptr<WorkerRoster> makeWorkerRoster(const Platform& platform,
   classes.push_back(std::make_unique<TalReportingSessionEnergylogWorkerClass>());
   classes.push_back(declining("TalReportingSessionMemoryLogWorker", kConsumerFromInit));
   classes.push_back(std::make_unique<TalReportingSessionPlumeWorkerClass>());
-  classes.push_back(declining("TalReportingSessionDriverSnapshotWorker", kProducer));
+  classes.push_back(std::make_unique<TalReportingSessionDriverSnapshotWorkerClass>(platform));
   classes.push_back(std::make_unique<TalReportingSessionSystemMonitorWorkerClass>(system_monitor));
   classes.push_back(std::make_unique<TalReportingSessionHoundWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionDPWorkerClass>(platform));

@@ -16,17 +16,19 @@ std::variant<DaemonOptions, ExitStatus> parsed(std::vector<const char*> argument
 TEST(CommandLine, ReadsItsOptions) {
   const auto options = std::get<DaemonOptions>(
       parsed({"--root", "/r", "--config-dir=/c", "--state-dir", "/s", "--runtime-dir", "/run", "--log-dir",
-              "/l", "--log-level", "debug", "--log-to", "journal"}));
+              "/l", "--host-root", "/h", "--log-level", "debug", "--log-to", "journal"}));
   EXPECT_EQ(options.directories.root, "/r");
   EXPECT_EQ(options.directories.config, "/c");
   EXPECT_EQ(options.directories.state, "/s");
   EXPECT_EQ(options.directories.runtime, "/run");
   EXPECT_EQ(options.directories.log, "/l");
+  EXPECT_EQ(options.host_root, "/h");
   EXPECT_EQ(options.log_level, LogLevel::kDebug);
   EXPECT_EQ(options.log_to, DaemonOptions::LogTo::kJournal);
 
   const auto none = std::get<DaemonOptions>(parsed({}));
   EXPECT_EQ(none.directories.root, std::nullopt);
+  EXPECT_EQ(none.host_root, "/");
   EXPECT_EQ(none.log_level, LogLevel::kDefault);
   EXPECT_EQ(none.log_to, DaemonOptions::LogTo::kStderr);
 }
@@ -40,7 +42,7 @@ TEST(CommandLine, AnswersOrComplainsAndStartsNothing) {
   EXPECT_EQ(std::get<ExitStatus>(parsed({"--help"})).value, 0);
   const std::string help = testing::internal::GetCapturedStdout();
   for (const char* option : {"--root", "--config-dir", "--state-dir", "--runtime-dir", "--log-dir",
-                             "--log-level", "--log-to", "--version", "--help"}) {
+                             "--host-root", "--log-level", "--log-to", "--version", "--help"}) {
     EXPECT_THAT(help, testing::HasSubstr(option));
   }
 

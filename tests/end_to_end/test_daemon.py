@@ -18,7 +18,7 @@ class CommandLine(unittest.TestCase):
     def test_help_and_version(self):
         run = run_program("talreportingd", "--help")
         self.assertEqual((run.returncode, run.stderr), (0, ""))
-        for option in "root config-dir state-dir runtime-dir log-dir log-level log-to version help".split():
+        for option in "root host-root config-dir state-dir runtime-dir log-dir log-level log-to version help".split():
             self.assertIn(f"--{option}", run.stdout)
         run = run_program("talreportingd", "--version")
         self.assertRegex(run.stdout, r"^talreportingd \d+\.\d+\.\d+\n$")

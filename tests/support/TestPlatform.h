@@ -14,6 +14,7 @@
 
 #include "core/Log.h"
 #include "platform/Platform.h"
+#include "support/FakeDriverStatsFeed.h"
 #include "support/FakeFlutterRequestService.h"
 #include "support/FakeNotifyCenter.h"
 #include "support/FakeTapToKiteService.h"
@@ -174,6 +175,7 @@ struct TestPlatform {
   RecordingEnergylog energylog;
   FakeSystemState system_state;
   FakeDiagnosticLog diagnostic_log;
+  FakeDriverStatsFeed driver_stats;
   FakeFlutterRequestService flutter_requests;
   FakeTapToKiteService tap_to_kite;
   Platform platform{.reporting_queue = queue,
@@ -189,6 +191,7 @@ struct TestPlatform {
                     .energylog = energylog,
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
+                    .driver_stats = driver_stats,
                     .flutter_requests = flutter_requests,
                     .tap_to_kite = tap_to_kite};
 };

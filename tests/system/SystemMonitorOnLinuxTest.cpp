@@ -47,6 +47,7 @@ TEST(SystemMonitorOnLinux, ANewDeviceNameReachesEveryRunningSessionAtItsNotifica
                           .energylog = host.energylog,
                           .system_state = host.system_state,
                           .diagnostic_log = host.diagnostic_log,
+                          .driver_stats = host.driver_stats,
                           .flutter_requests = host.flutter_requests,
                           .tap_to_kite = host.tap_to_kite};
   write_name("one");

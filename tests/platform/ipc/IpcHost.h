@@ -135,6 +135,7 @@ class IpcHost {
   RecordingEnergylog energylog;
   FakeSystemState system_state;
   FakeDiagnosticLog diagnostic_log;
+  FakeDriverStatsFeed driver_stats;
   FakeFlutterRequestService flutter_requests;
   FakeTapToKiteService tap_to_kite;
   ReportingQueue queue{"test"};
@@ -151,6 +152,7 @@ class IpcHost {
                     .energylog = energylog,
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
+                    .driver_stats = driver_stats,
                     .flutter_requests = flutter_requests,
                     .tap_to_kite = tap_to_kite};
   TalReportingSystemMonitor system_monitor{platform};
