@@ -124,6 +124,20 @@ class NoDiagnosticLog final : public DiagnosticLog {
   Opened createFile(std::string_view, std::string_view) override { return {nullptr, "none here"}; }
 };
 
+class NoDrivers final : public DriverStatsFeed {
+ public:
+  Result<DriverStatsChannelSet> copyChannels(const std::optional<std::string>&,
+                                             const std::optional<std::string>&) override {
+    return {};
+  }
+  Subscribed createSubscription(const DriverStatsChannelSet&) override { return {}; }
+  Result<SampleSetPointer> createSamples(const DriverStatsSubscription&) override { return {}; }
+  Result<std::vector<DriverStatsChannel>> createSamplesDelta(const DriverStatsSampleSet*,
+                                                             const DriverStatsSampleSet&) override {
+    return {};
+  }
+};
+
 class NoFlutterRequests final : public FlutterRequestService {
  public:
   void requestFlutter(FlutterRequest) override {}
@@ -152,6 +166,7 @@ struct Host {
   NoMetrics plume_metrics;
   NoEnergylog energylog;
   CalmDevice system_state;
+  NoDrivers driver_stats;
   NoDiagnosticLog no_diagnostic_log;
   DiagnosticLog& diagnostic_log = no_diagnostic_log;
   NoFlutterRequests flutter_requests;
@@ -170,6 +185,7 @@ struct Host {
                     .energylog = energylog,
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
+                    .driver_stats = driver_stats,
                     .flutter_requests = flutter_requests,
                     .tap_to_kite = tap_to_kite,
                     .symptom_reporters = &captures,
