@@ -153,6 +153,11 @@ class NoTapToKite final : public TapToKiteService {
   void createDraft(KiteDraft, std::optional<std::string>, std::string, Completion) override {}
 };
 
+class NoCommandShell final : public CommandShell {
+ public:
+  bool run(const std::string&, const Output&) override { return false; }
+};
+
 struct Host {
   NoQueue queue;
   SystemClock clock;
@@ -171,6 +176,7 @@ struct Host {
   DiagnosticLog& diagnostic_log = no_diagnostic_log;
   NoFlutterRequests flutter_requests;
   NoTapToKite tap_to_kite;
+  NoCommandShell command_shell;
   NoCaptures captures;
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
@@ -188,6 +194,7 @@ struct Host {
                     .driver_stats = driver_stats,
                     .flutter_requests = flutter_requests,
                     .tap_to_kite = tap_to_kite,
+                    .command_shell = command_shell,
                     .symptom_reporters = &captures,
                     .internal_build = TalReportingUtilityIsInternalBuild(device)};
   TalReportingSystemMonitor system_monitor{platform};

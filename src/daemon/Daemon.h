@@ -27,6 +27,7 @@
 #include "platform/linux/process/SdtTracePoints.h"
 #include "platform/linux/settings/DeviceTomlProperties.h"
 #include "platform/linux/settings/TomlSettings.h"
+#include "platform/linux/shell/LinuxCommandShell.h"
 #include "platform/linux/store/StoreAnalyticsSink.h"
 #include "platform/linux/store/StoreEnergylogSink.h"
 #include "platform/linux/store/StorePlumeMetricSubmitter.h"
@@ -77,6 +78,7 @@ class Daemon {
   LinuxDriverStatsFeed driver_stats_;
   UnavailableFlutterRequestService flutter_requests_;
   LinuxTapToKiteService tap_to_kite_;
+  LinuxCommandShell command_shell_;
   LinuxTracing tracing_;
   // Destroyed after the queue's thread, whose tasks use them, has ended.
   ReportingQueue queue_;

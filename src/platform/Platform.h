@@ -3,6 +3,7 @@
 #include "core/Log.h"
 #include "platform/AnalyticsSink.h"
 #include "platform/Clock.h"
+#include "platform/CommandShell.h"
 #include "platform/DeviceProperties.h"
 #include "platform/DiagnosticLog.h"
 #include "platform/DriverStatsFeed.h"
@@ -40,6 +41,7 @@ struct Platform {
   DriverStatsFeed& driver_stats;
   FlutterRequestService& flutter_requests;
   TapToKiteService& tap_to_kite;
+  CommandShell& command_shell;
   /// Null on a host that takes no captures, as on every customer build.
   SymptomReporterFactory* symptom_reporters = nullptr;
   /// `TalReportingUtilityIsInternalBuild`, asked once.

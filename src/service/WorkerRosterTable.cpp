@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "drivers/TalReportingSessionDriverSnapshotWorker.h"
+#include "drivers/TalReportingSessionMemoryLogWorker.h"
 #include "session/DecliningWorkerClass.h"
 #include "system/TalReportingSessionSystemMonitorWorker.h"
 #include "tracing/TalReportingSessionTraceWorker.h"
@@ -28,7 +29,6 @@ using Traits = TalReportingSessionWorkerClass::Traits;
 
 constexpr Traits kNeither{};
 constexpr Traits kConsumer{.is_consumer = true};
-constexpr Traits kConsumerFromInit{.is_consumer = true, .start_on_init = true};
 constexpr Traits kSingleMessageConsumer{.is_consumer = true, .handle_single_message_session = true};
 
 std::unique_ptr<TalReportingSessionWorkerClass> declining(std::string_view name, Traits traits) {
@@ -52,7 +52,7 @@ std::unique_ptr<WorkerRoster> makeWorkerRoster(const Platform& platform,
   classes.push_back(std::make_unique<TalReportingSessionInputMessagesWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionTallyWorkerClass>(platform.analytics));
   classes.push_back(std::make_unique<TalReportingSessionEnergylogWorkerClass>());
-  classes.push_back(declining("TalReportingSessionMemoryLogWorker", kConsumerFromInit));
+  classes.push_back(std::make_unique<TalReportingSessionMemoryLogWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionPlumeWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionDriverSnapshotWorkerClass>(platform));
   classes.push_back(std::make_unique<TalReportingSessionSystemMonitorWorkerClass>(system_monitor));

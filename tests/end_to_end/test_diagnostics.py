@@ -6,9 +6,11 @@ import shutil
 import subprocess
 import unittest
 
-from tal_harness import DaemonTest, PLAYBACK
+import talreporting
+from tal_harness import DaemonTest, GENERIC, PLAYBACK
 
 IO, ERROR_TYPE = 7, 6
+MEMORY_LOG = 19
 WORKER_SETTINGS = "settings/org.vantle.talsys.talreporting.toml"
 PROMPTS = {"device.toml": "InternalBuild = true\n", WORKER_SETTINGS: "ParleyInvalidXyBackOffSeconds = 3600.0\n"}
 OVERLOAD = {"smallest_buffer_frame_size": 512, "io_cycle": 9}
@@ -24,6 +26,19 @@ class CustomerBuild(DaemonTest):
         client.send_message(OVERLOAD, IO, ERROR_TYPE, [7])
         self.assertEqual(len(self.daemon.events("org.vantle.talsys.IO.Error")), 1)
         self.assertFalse((self.daemon.root / "run/notify/org.vantle.talsys.dropped-flutter").exists())
+
+    def test_memory_is_logged_for_test_sessions_alone(self):
+        client = self.connect()
+        client.create_reporting_session(7)
+        client.start_reporting_session(7)
+        client.send_message({"n": 1}, GENERIC, MEMORY_LOG, [7])
+        self.daemon.settle()
+        self.assertNotIn("wiredlog:", self.daemon.log())
+        client.set_service_type(7, talreporting.SERVICE_TYPES["test"])
+        client.start_reporting_session(7)
+        client.send_message({"n": 2}, GENERIC, MEMORY_LOG, [7])
+        self.daemon.settle()
+        self.assertIn("wiredlog: request talresources captured", self.daemon.log())
 
 
 def send_invalid_coordinates(client, reporter):
@@ -82,6 +97,21 @@ class InternalBuild(DaemonTest):
                          ("talreportingd", "Invalid x/y coordinates during a Parley call (TTK)"))
         self.assertIn("log/Audio/Drafts/", arguments[4])
         self.assertEqual(daemon.terminate(), 0)
+
+    def test_memory_is_logged_for_a_message_without_a_session(self):
+        client = self.connect()
+        for number in (1, 2):  # the second comes too soon
+            client.send_message({"n": number}, PLAYBACK, MEMORY_LOG)
+        self.daemon.settle()
+        lines = [line for line in self.daemon.log().splitlines() if "wiredlog:" in line]
+        self.assertEqual([line.split("wiredlog: ")[1] for line in lines if "captured" in line].count(
+            "request talresources captured"), 1)
+        blocks = [line for line in lines if "WIRED LOG BLOCK" in line]
+        self.assertTrue(blocks and all(" error " in line for line in lines))
+        process = self.daemon.process.pid
+        (daemon_block,) = (block for block in blocks if f"wiredlog: RESOURCE talreportingd ({process})" in block)
+        self.assertIn(" cpu_time ", daemon_block)
+        self.assertTrue(any("MemTotal" in block or "slabinfo" in block for block in blocks))
 
     def start(self, *command, **options):
         process = subprocess.Popen(command, stdin=subprocess.DEVNULL, **options)

@@ -6,6 +6,7 @@
 #include <functional>
 #include <map>
 #include <memory>
+#include <mutex>
 #include <optional>
 #include <set>
 #include <string>
@@ -14,6 +15,7 @@
 
 #include "core/Log.h"
 #include "platform/Platform.h"
+#include "support/FakeCommandShell.h"
 #include "support/FakeDriverStatsFeed.h"
 #include "support/FakeFlutterRequestService.h"
 #include "support/FakeNotifyCenter.h"
@@ -24,7 +26,8 @@
 
 namespace tal::test {
 
-/// Keeps every line, without its source prefix.
+/// Keeps every line, without its source prefix. Lines may come on any thread; they
+/// are read when no other thread logs.
 class RecordingLogSink final : public LogSink {
  public:
   struct Line {
@@ -35,6 +38,7 @@ class RecordingLogSink final : public LogSink {
 
   void write(std::string_view channel, LogLevel level, std::string_view line) override {
     constexpr std::size_t kNumberColumns = 7;  // what follows the file name in "%25s:%-5d "
+    const std::lock_guard lock(mutex_);
     lines.push_back({std::string(channel), level, std::string(line.substr(line.find(':') + kNumberColumns))});
   }
 
@@ -48,6 +52,9 @@ class RecordingLogSink final : public LogSink {
   }
 
   std::vector<Line> lines;
+
+ private:
+  std::mutex mutex_;
 };
 
 /// Wants every event unless told which.
@@ -178,6 +185,7 @@ struct TestPlatform {
   FakeDriverStatsFeed driver_stats;
   FakeFlutterRequestService flutter_requests;
   FakeTapToKiteService tap_to_kite;
+  FakeCommandShell command_shell;
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
                     .log = channels,
@@ -193,7 +201,8 @@ struct TestPlatform {
                     .diagnostic_log = diagnostic_log,
                     .driver_stats = driver_stats,
                     .flutter_requests = flutter_requests,
-                    .tap_to_kite = tap_to_kite};
+                    .tap_to_kite = tap_to_kite,
+                    .command_shell = command_shell};
 };
 
 }  // namespace tal::test

@@ -49,7 +49,8 @@ TEST(SystemMonitorOnLinux, ANewDeviceNameReachesEveryRunningSessionAtItsNotifica
                           .diagnostic_log = host.diagnostic_log,
                           .driver_stats = host.driver_stats,
                           .flutter_requests = host.flutter_requests,
-                          .tap_to_kite = host.tap_to_kite};
+                          .tap_to_kite = host.tap_to_kite,
+                          .command_shell = host.command_shell};
   write_name("one");
   TalReportingSystemMonitor monitor(platform);
   monitor.initializeWithQueue(queue);

@@ -138,6 +138,7 @@ class IpcHost {
   FakeDriverStatsFeed driver_stats;
   FakeFlutterRequestService flutter_requests;
   FakeTapToKiteService tap_to_kite;
+  FakeCommandShell command_shell;
   ReportingQueue queue{"test"};
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
@@ -154,7 +155,8 @@ class IpcHost {
                     .diagnostic_log = diagnostic_log,
                     .driver_stats = driver_stats,
                     .flutter_requests = flutter_requests,
-                    .tap_to_kite = tap_to_kite};
+                    .tap_to_kite = tap_to_kite,
+                    .command_shell = command_shell};
   TalReportingSystemMonitor system_monitor{platform};
   std::unique_ptr<WorkerRoster> roster = makeWorkerRoster(platform, system_monitor);
   std::promise<void> killed;
