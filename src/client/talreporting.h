@@ -462,6 +462,26 @@ TAL_API tal_status tal_look_up_all_reporters(tal_connection* connection, tal_rep
  */
 TAL_API tal_status tal_kill_service(tal_connection* connection) TAL_NOEXCEPT;
 
+/* ---- Signposts --------------------------------------------------------------------------------------------
+ */
+
+/*
+ * A signpost says when a piece of work began and when it ended; performance traces of test sessions time it.
+ * It needs no connection. Both functions may be called from any thread at any time and never wait, lock or
+ * allocate; begin and end of one piece belong to one thread, and may nest. While nothing is recorded they
+ * cost about a nanosecond. `subsystem` is "org.vantle.audio" for what is to be timed.
+ *
+ * Recording needs the tracer, which starts threads of its own in the program. It is therefore loaded on
+ * demand alone: by talreporting_signpost_enable(), or, before main() begins, where the environment variable
+ * TALREPORTING_SIGNPOSTS is 1.
+ */
+
+/** Loads the tracer, once; may take seconds. TAL_OUT_OF_MEMORY where it is not installed. */
+TAL_API tal_status talreporting_signpost_enable(void) TAL_NOEXCEPT;
+
+TAL_API void talreporting_signpost_begin(const char* subsystem, const char* name) TAL_NOEXCEPT;
+TAL_API void talreporting_signpost_end(const char* subsystem, const char* name) TAL_NOEXCEPT;
+
 /* ---- Statistics -------------------------------------------------------------------------------------------
  */
 

@@ -148,6 +148,22 @@ class Message {
   std::unique_ptr<tal_message, Free> handle_;
 };
 
+/// A signpost around a block: begins with the object and ends with it. The texts outlive it; see
+/// talreporting_signpost_begin().
+class Signpost {
+ public:
+  Signpost(const char* subsystem, const char* name) noexcept : subsystem_(subsystem), name_(name) {
+    talreporting_signpost_begin(subsystem_, name_);
+  }
+  Signpost(const Signpost&) = delete;
+  Signpost& operator=(const Signpost&) = delete;
+  ~Signpost() { talreporting_signpost_end(subsystem_, name_); }
+
+ private:
+  const char* subsystem_;
+  const char* name_;
+};
+
 /// What to be told of and how to connect: tal_options and tal_callbacks with std::function. The functions are
 /// called on the library's thread and must not throw (a throw ends the program).
 struct Options {
