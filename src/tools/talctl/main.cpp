@@ -8,12 +8,14 @@
 #include <iostream>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "tools/talctl/CommandFailure.h"
 #include "tools/talctl/DaemonCommands.h"
 #include "tools/talctl/DaemonLocation.h"
 #include "tools/talctl/EventsCommand.h"
 #include "tools/talctl/NotifyCommand.h"
+#include "tools/talctl/PerfCommand.h"
 #include "tools/talctl/ReplayCommand.h"
 #include "tools/talctl/SettingsCommand.h"
 #include "tools/talctl/Terminal.h"
@@ -32,6 +34,7 @@ struct CommandLine {
   SendOptions send;
   EventsOptions events;
   std::string script;
+  std::vector<std::string> files;
   std::string notification;
   std::string state;
   std::string domain;
@@ -125,6 +128,16 @@ void addSettings(CLI::App& app, CommandLine& line) {
   });
 }
 
+void addPerf(CLI::App& app, CommandLine& line) {
+  CLI::App* command = app.add_subcommand("perf", "Read what performance traces measured");
+  command->require_subcommand(1);
+  CLI::App* show = command->add_subcommand("show", "Print one results file, or two side by side");
+  show->add_option("FILE", line.files, "One or two .pdj files")->required();
+  show->callback([&line] {
+    line.run = [&line](const auto&, const auto& terminal) { runPerfShow(line.files, terminal); };
+  });
+}
+
 void addKill(CLI::App& app, CommandLine& line) {
   CLI::App* command = app.add_subcommand("kill", "End the daemon at once, after its store is committed");
   command->callback([&line] { line.run = [](const auto& daemon, const auto&) { runKill(daemon); }; });
@@ -149,6 +162,7 @@ int run(int argc, char** argv) {
   addEvents(app, line);
   addNotify(app, line);
   addSettings(app, line);
+  addPerf(app, line);
   addKill(app, line);
 
   try {
