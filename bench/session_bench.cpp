@@ -17,6 +17,7 @@
 #include "core/DictShape.h"
 #include "platform/Platform.h"
 #include "platform/linux/diagnostic_log/LinuxDiagnosticLog.h"
+#include "platform/linux/logging/LogRing.h"
 #include "service/WorkerRosterTable.h"
 #include "session/TalReportingSession.h"
 #include "system/TalReportingSystemMonitor.h"
@@ -161,7 +162,7 @@ class NoCommandShell final : public CommandShell {
 struct Host {
   NoQueue queue;
   SystemClock clock;
-  LogChannels log{nullptr};
+  LogChannels log;
   NoTrace trace;
   Device device;
   NoSettings settings;
@@ -201,10 +202,11 @@ struct Host {
   std::unique_ptr<WorkerRoster> roster = makeWorkerRoster(platform, system_monitor);
   std::size_t kept_bytes = 0;
 
-  explicit Host(bool internal_build = false) : device(internal_build) {
+  explicit Host(bool internal_build = false, LogSink* sink = nullptr)
+      : log(sink, LogLevel::kDebug), device(internal_build) {
     system_monitor.initializeWithQueue(queue);
   }
-  explicit Host(DiagnosticLog& log_directory) : device(false), diagnostic_log(log_directory) {
+  explicit Host(DiagnosticLog& log_directory) : log(nullptr), device(false), diagnostic_log(log_directory) {
     system_monitor.initializeWithQueue(queue);
   }
 
@@ -438,6 +440,25 @@ void BugCaptureUninterested(benchmark::State& state) {
                          benchmark::Counter::kIsRate | benchmark::Counter::kInvert);
 }
 BENCHMARK(BugCaptureUninterested);
+
+class NoLog final : public LogSink {
+ public:
+  void write(std::string_view, LogLevel, std::string_view) override {}
+};
+
+// What a message's intake costs an internal build, which keeps its last log lines.
+void InternalBuildIntake(benchmark::State& state) {
+  NoLog nowhere;
+  LogRing ring(nowhere, LogLevel::kError);
+  Host host(/*internal_build=*/true, state.range(0) != 0 ? &ring : nullptr);
+  MessageMaker maker;
+  auto session = host.makeSession();
+  session->setServiceType(AudioServiceType::kLongformaudio);
+  session->start();
+  for (auto _ : state) send(*session, maker);
+  state.SetItemsProcessed(state.iterations());
+}
+BENCHMARK(InternalBuildIntake)->ArgName("ring")->Arg(0)->Arg(1)->Iterations(200'000);
 
 }  // namespace
 }  // namespace tal

@@ -20,6 +20,7 @@ namespace tal {
 namespace {
 
 constexpr int kExitKilled = 2;
+constexpr std::string_view kCaptureQueueLabel = "org.vantle.talsys.reporting.capture";
 // Files are the daemon's user's and group's.
 constexpr mode_t kFileMask = 0027;
 // Descriptors that are not clients: the store, logs, event queues.
@@ -60,8 +61,11 @@ Daemon::Daemon(const DaemonOptions& options, const std::string& version)
     : directories_(preparedDirectories(options)),
       lock_(directories_.state),
       log_sink_(makeLogSink(options.log_to)),
-      log_(log_sink_.get(), options.log_level),
-      device_properties_(directories_.config, log_.service),
+      startup_log_(log_sink_.get(), options.log_level),
+      device_properties_(directories_.config, startup_log_.service),
+      internal_build_(TalReportingUtilityIsInternalBuild(device_properties_)),
+      log_ring_(internal_build_ ? std::make_unique<LogRing>(*log_sink_, options.log_level) : nullptr),
+      log_(log_ring_ ? log_ring_.get() : log_sink_.get(), log_ring_ ? LogLevel::kDebug : options.log_level),
       settings_({.config_directory = directories_.config,
                  .state_directory = directories_.state,
                  .clock = clock_,
@@ -90,6 +94,10 @@ Daemon::Daemon(const DaemonOptions& options, const std::string& version)
                 .clock = clock_,
                 .log = log_.trace}),
       queue_(kReportingServerQueueLabel),
+      capture_queue_(internal_build_ ? std::make_unique<ReportingQueue>(kCaptureQueueLabel,
+                                                                        ReportingQueue::kBackgroundNiceness)
+                                     : nullptr),
+      captures_(capture_queue_ ? makeCaptureService() : nullptr),
       platform_{.reporting_queue = queue_,
                 .clock = clock_,
                 .log = log_,
@@ -107,7 +115,8 @@ Daemon::Daemon(const DaemonOptions& options, const std::string& version)
                 .flutter_requests = flutter_requests_,
                 .tap_to_kite = tap_to_kite_,
                 .command_shell = command_shell_,
-                .internal_build = TalReportingUtilityIsInternalBuild(device_properties_),
+                .symptom_reporters = captures_.get(),
+                .internal_build = internal_build_,
                 .tracing = &tracing_.platform()},
       system_monitor_(platform_),
       roster_(makeWorkerRoster(platform_, system_monitor_)),
@@ -117,6 +126,31 @@ Daemon::Daemon(const DaemonOptions& options, const std::string& version)
   // A client or a log reader that goes away is an error of one write, no more.
   std::signal(SIGPIPE, SIG_IGN);
   raiseDescriptorLimit(readIpcSettings(settings_).max_connections);
+}
+
+std::unique_ptr<CaptureService> Daemon::makeCaptureService() {
+  auto writer =
+      std::make_shared<const CaptureWriter>(CaptureWriter::Dependencies{.log_directory = directories_.log,
+                                                                        .state_directory = directories_.state,
+                                                                        .clock = clock_,
+                                                                        .settings = settings_,
+                                                                        .log_ring = *log_ring_,
+                                                                        .log = log_.hound});
+  return std::make_unique<CaptureService>(
+      CaptureService::Dependencies{.reporting_queue = queue_,
+                                   .work_queue = *capture_queue_,
+                                   .clock = clock_,
+                                   .settings = settings_,
+                                   .processes = processes_,
+                                   .log = log_.hound,
+                                   .writer = std::move(writer),
+                                   .client_processes = [this] { return clientProcesses(); }});
+}
+
+std::vector<std::int32_t> Daemon::clientProcesses() const {
+  std::vector<std::int32_t> processes;
+  for (const auto& client : service_.getAllClients()) processes.push_back(client->processIdentifier());
+  return processes;
 }
 
 ListeningSocket Daemon::listeningSocket() const {
@@ -152,6 +186,8 @@ void Daemon::endInOrder() {
     stopped.set_value();
   });
   stopped.get_future().wait();
+  // Captures that were asked for are still written; timed ones are not waited for.
+  if (capture_queue_) capture_queue_->stop();
   store_.flushAndClose();
   listener_.stop();
   queue_.stop();

@@ -13,11 +13,13 @@
 #include "daemon/Directories.h"
 #include "daemon/StoreDurabilityGate.h"
 #include "platform/Platform.h"
+#include "platform/linux/capture/CaptureService.h"
 #include "platform/linux/diagnostic_log/LinuxDiagnosticLog.h"
 #include "platform/linux/driver_stats/LinuxDriverStatsFeed.h"
 #include "platform/linux/flutter/UnavailableFlutterRequestService.h"
 #include "platform/linux/ipc/IpcListener.h"
 #include "platform/linux/kite/LinuxTapToKiteService.h"
+#include "platform/linux/logging/LogRing.h"
 #include "platform/linux/logging/StderrLogSink.h"
 #include "platform/linux/notify/LinuxNotifyCenter.h"
 #include "platform/linux/process/InstanceLock.h"
@@ -53,6 +55,8 @@ class Daemon {
   void run();
 
  private:
+  std::unique_ptr<CaptureService> makeCaptureService();
+  std::vector<std::int32_t> clientProcesses() const;
   ListeningSocket listeningSocket() const;
   TalReportingService::Options serviceOptions();
   [[noreturn]] void endProcess();
@@ -61,11 +65,15 @@ class Daemon {
   const Directories directories_;
   const InstanceLock lock_;
   const std::unique_ptr<LogSink> log_sink_;
-  const LogChannels log_;
+  // For what is read before it is known whether the build is internal.
+  const LogChannels startup_log_;
   LinuxClock clock_;
   SdtTracePoints trace_points_;
   LinuxProcessTable processes_;
   DeviceTomlProperties device_properties_;
+  const bool internal_build_;
+  const std::unique_ptr<LogRing> log_ring_;  // null on a customer build
+  const LogChannels log_;
   TomlSettings settings_;
   StoreWriter store_;
   StoreAnalyticsSink analytics_;
@@ -82,6 +90,10 @@ class Daemon {
   LinuxTracing tracing_;
   // Destroyed after the queue's thread, whose tasks use them, has ended.
   ReportingQueue queue_;
+  // Null on a customer build. The work of the second runs on the first, and comes
+  // back to the queue above, which outlives both.
+  const std::unique_ptr<ReportingQueue> capture_queue_;
+  const std::unique_ptr<CaptureService> captures_;
   const Platform platform_;
   TalReportingSystemMonitor system_monitor_;
   const std::unique_ptr<WorkerRoster> roster_;

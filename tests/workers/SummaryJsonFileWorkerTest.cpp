@@ -110,20 +110,6 @@ TEST_F(SummaryJsonFileWorker, FailuresAreLoggedAndLeaveTheSessionAlone) {
   EXPECT_THAT(theFile(), IsEmpty());
 }
 
-TEST(SafeInFileName, KeepsWhatIsHarmless) {
-  const std::string eighty(80, 'x');
-  const std::vector<std::pair<std::string, std::string>> rows{
-      {"my.app", "my.app"},
-      {"../../etc/passwd", "___.._etc_passwd"},
-      {"...", "___"},
-      {"a\nb\x7F", "a_b_"},
-      {std::string("a\0b", 3), "a_b"},
-      {"", ""},
-      {eighty + "y", eighty},
-      {std::string(79, 'x') + "\xC3\xA9", std::string(79, 'x')}};
-  for (const auto& [text, name] : rows) EXPECT_EQ(safeInFileName(text), name);
-}
-
 // Files of random finite values parse, and hold each message once.
 TEST_F(SummaryJsonFileWorker, RandomSessionsParseWithAnotherReader) {
   std::mt19937 random(53);

@@ -18,10 +18,6 @@ namespace tal {
 /// Where the files go, below the diagnostic-log directory.
 inline constexpr std::string_view TalReportingLogsDirectory = "Audio/Reporting";
 
-/// A client's text made fit to be part of a file name: "/", control characters
-/// and leading dots become "_"; at most 80 bytes, cut between characters.
-std::string safeInFileName(std::string_view text);
-
 /// The file holds a JSON array, one entry for each non-redundant message:
 /// {"<category>_<type>_<n>": {…}}, where n counts the messages of the kind from
 /// 1. Entries are written one by one, so memory stays flat.

@@ -2,6 +2,7 @@
 
 #include <cstddef>
 
+#include "core/DateText.h"
 #include "core/Utf8.h"
 
 namespace tal {
@@ -55,6 +56,20 @@ void appendEscaped(std::string& out, std::string_view text) {
       text.remove_prefix(1);
     }
   }
+}
+
+void appendLogLine(std::string& out, double seconds_since_1970, std::string_view channel, LogLevel level,
+                   std::string_view line) {
+  constexpr std::size_t kLevelColumns = 7;
+  appendRfc3339(out, seconds_since_1970);
+  out += ' ';
+  out += channel;
+  out += ' ';
+  const std::string_view name = logLevelName(level);
+  out += name;
+  out.append(kLevelColumns - name.size() + 1, ' ');
+  appendEscaped(out, line);
+  out += '\n';
 }
 
 }  // namespace tal

@@ -9,14 +9,11 @@
 #include <ctime>
 #include <string>
 
-#include "core/DateText.h"
 #include "platform/linux/logging/LogLine.h"
 
 namespace tal {
 
 namespace {
-
-constexpr std::size_t kLevelColumns = 7;
 
 double secondsSince1970() {
   return std::chrono::duration<double>(std::chrono::system_clock::now().time_since_epoch()).count();
@@ -52,15 +49,7 @@ class BrokenPipeGuard {
 void StderrLogSink::write(std::string_view channel, LogLevel level, std::string_view line) {
   std::string text;
   text.reserve(line.size() + 64);
-  appendRfc3339(text, secondsSince1970());
-  text += ' ';
-  text += channel;
-  text += ' ';
-  const std::string_view name = logLevelName(level);
-  text += name;
-  text.append(kLevelColumns - name.size() + 1, ' ');
-  appendEscaped(text, line);
-  text += '\n';
+  appendLogLine(text, secondsSince1970(), channel, level, line);
   writeWhole(text);
 }
 

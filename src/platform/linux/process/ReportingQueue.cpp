@@ -13,23 +13,21 @@ namespace {
 
 // The kernel's bound for thread names, without the end mark.
 constexpr std::size_t kLongestThreadName = 15;
-// Ahead of ordinary work, behind audio threads, which run in real time.
-constexpr int kRaisedNiceness = -10;
 // A burst's vector is not kept for ever.
 constexpr std::size_t kMostTasksKeptAllocated = 1024;
 
-void nameAndRaiseThisThread(std::string_view label) {
+void nameAndRankThisThread(std::string_view label, int niceness) {
   if (label.size() > kLongestThreadName) label.remove_prefix(label.size() - kLongestThreadName);
   pthread_setname_np(pthread_self(), std::string(label).c_str());
   // Refused to ordinary users, who then get ordinary service.
-  setpriority(PRIO_PROCESS, 0, kRaisedNiceness);
+  setpriority(PRIO_PROCESS, 0, niceness);
 }
 
 }  // namespace
 
-ReportingQueue::ReportingQueue(std::string_view label) {
-  thread_ = std::thread([this, name = std::string(label)] {
-    nameAndRaiseThisThread(name);
+ReportingQueue::ReportingQueue(std::string_view label, int niceness) {
+  thread_ = std::thread([this, niceness, name = std::string(label)] {
+    nameAndRankThisThread(name, niceness);
     run();
   });
   thread_id_ = thread_.get_id();

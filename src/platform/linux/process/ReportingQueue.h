@@ -21,13 +21,18 @@ namespace tal {
 /// woken once however much is posted, and while nothing is posted and no timer
 /// is due it does not wake up.
 ///
-/// 1. The constructor starts the thread, named after the end of `label`, at a
-///    raised priority where the process is permitted one.
+/// 1. The constructor starts the thread, named after the end of `label`, at the
+///    niceness where the process is permitted it.
 /// 2. `stop` or `stopDropping` ends it; the destructor does the latter.
 /// 3. Whatever is posted after that is destroyed unrun, on the posting thread.
 class ReportingQueue final : public SerialQueue {
  public:
-  explicit ReportingQueue(std::string_view label);
+  /// Ahead of ordinary work, behind audio threads, which run in real time.
+  static constexpr int kRaisedNiceness = -10;
+  /// For what must not be felt by anybody.
+  static constexpr int kBackgroundNiceness = 10;
+
+  explicit ReportingQueue(std::string_view label, int niceness = kRaisedNiceness);
   ReportingQueue(const ReportingQueue&) = delete;
   ReportingQueue& operator=(const ReportingQueue&) = delete;
   ~ReportingQueue() override;

@@ -1,0 +1,12 @@
+#pragma once
+
+#include <string>
+#include <string_view>
+
+namespace tal {
+
+/// A client's text made fit to be part of a file name: "/", control characters
+/// and leading dots become "_"; at most 80 bytes, cut between characters.
+std::string safeInFileName(std::string_view text);
+
+}  // namespace tal
