@@ -100,6 +100,12 @@ TEST_F(DriverSnapshotWorker, AStopWithoutAStartReportsNothing) {
   count(5);
   worker.stop();
   EXPECT_THAT(reported(), IsEmpty());
+  worker.start();
+  count(7);
+  worker.stop();
+  count(1);
+  worker.stop();
+  EXPECT_THAT(reported(), ElementsAre("Tx_Simple_n=7 ")) << "the snapshot is gone";
 }
 
 TEST_F(DriverSnapshotWorker, ADriverThatFailsAtTheStartIsLoggedAtTheStopAndTheOthersAreReported) {

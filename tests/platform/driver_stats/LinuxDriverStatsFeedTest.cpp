@@ -113,6 +113,8 @@ TEST_F(DriverStatsOfMachine, ChannelsAreThoseThatTheKernelHasASourceFor) {
     EXPECT_THAT(channelsOf(group), IsEmpty()) << group;
   }
   EXPECT_THAT(channelsOf({}, "MCA"), SizeIs(1));
+  write("sys/class/sound/card1/device/power/runtime_status", "unsupported\n");
+  EXPECT_THAT(channelsOf("StateTransitionTimes_ms"), SizeIs(2)) << "of a driver that manages no power";
   fs::remove_all(root());
   EXPECT_THAT(channelsOf({}), IsEmpty()) << "a machine without sound";
   EXPECT_THAT(lines.lines(), IsEmpty());
@@ -169,8 +171,12 @@ TEST_F(DriverStatsOfMachine, OverlappingReadingsDoNotTakeEachOthersPeaks) {
   EXPECT_THAT(since(*first, *capture), ElementsAre("Headset pcm0c sub0 Largest Fill 700"));
 }
 
-TEST_F(DriverStatsOfMachine, InterruptsOfASharedLineBelongToNobody) {
-  edit("proc/interrupts", "snd_hda_intel:card0", "i2c_designware, snd_hda_intel:card0");
+TEST_F(DriverStatsOfMachine, InterruptsAreTheCardsByNameOrByItsDeviceUnlessTheLineIsShared) {
+  edit("proc/interrupts", "snd_hda_intel:card0", "AudioDSP");
+  EXPECT_THAT(channelsOf({}, "MCA"), SizeIs(1));
+  fs::remove_all(root() / "sys/devices/pci0000:00/0000:00:1f.3/msi_irqs");
+  EXPECT_THAT(channelsOf({}, "MCA"), SizeIs(1));
+  edit("proc/interrupts", "AudioDSP", "i2c_designware, snd_hda_intel:card0");
   EXPECT_THAT(channelsOf({}, "MCA"), IsEmpty());
   edit("proc/interrupts", "i801_smbus", "snd_ens1371:card1");
   EXPECT_EQ(nameOf(channelsOf({}, "MCA").at(0)), "USB-Audio|-|MCA|Headset Interrupts|interrupts");
