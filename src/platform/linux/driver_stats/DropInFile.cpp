@@ -31,7 +31,9 @@ void checkKeys(const Json& object, std::initializer_list<std::string_view> known
   if (!object.is_object()) throw DropInMistake{where + " is not an object"};
   for (const auto& [key, value] : object.items()) {
     if (std::find(known.begin(), known.end(), key) == known.end()) {
-      throw DropInMistake{where + " has an unknown key \"" + key + '"'};
+      std::string text = where;
+      text.append(" has an unknown key \"").append(key).append("\"");
+      throw DropInMistake{text};
     }
   }
 }
@@ -81,7 +83,7 @@ std::vector<DropInChannel> channelsOf(const Json& file) {
                                            .group = textOf(file, "group", "the file"),
                                            .subgroup = textOf(file, "subgroup", "the file")};
   if (!description.group && !description.subgroup) {
-    throw DropInMistake{"the file has neither \"group\" nor \"subgroup\""};
+    throw DropInMistake{R"(the file has neither "group" nor "subgroup")"};
   }
   const auto list = file.find("channels");
   if (list == file.end() || !list->is_array() || list->empty() || list->size() > kMostChannels) {

@@ -35,8 +35,6 @@ bool isPcmDirectory(std::string_view name, char suffix) {
   return name.starts_with("pcm") && name.ends_with(suffix);
 }
 
-std::string_view firstWord(std::string_view text) { return takeWord(text); }
-
 }  // namespace
 
 void SoundHardware::read(const DriverStatsChannelSet& wanted, ChannelReadings& readings) {
@@ -59,20 +57,24 @@ void SoundHardware::readSubstreams(const std::vector<SoundCard>& cards, Directio
                                    ChannelReadings& readings) {
   Peaks peaks;  // of those that are still there
   for (const SoundCard& card : cards) {
-    const std::string card_path = pathOfCard(card);
-    for (const std::string& device : files_.namesIn(card_path)) {
-      if (!isPcmDirectory(device, direction.suffix)) continue;
-      // Substreams are numbered without gaps.
-      for (int i = 0;; ++i) {
-        const std::string substream = "sub" + std::to_string(i);
-        auto reading = readStatus(card_path + '/' + device + '/' + substream, readings);
-        if (!reading) break;
-        readSubstream(card, card.identifier + ' ' + device + ' ' + substream, std::move(*reading), direction,
-                      peaks, readings);
-      }
+    for (const std::string& device : files_.namesIn(pathOfCard(card))) {
+      if (isPcmDirectory(device, direction.suffix)) readDevice(card, device, direction, peaks, readings);
     }
   }
   direction.peaks = std::move(peaks);
+}
+
+void SoundHardware::readDevice(const SoundCard& card, const std::string& device, const Direction& direction,
+                               Peaks& peaks, ChannelReadings& readings) const {
+  const std::string path = pathOfCard(card) + '/' + device + "/sub";
+  const std::string name = card.identifier + ' ' + device + " sub";
+  // Substreams are numbered without gaps.
+  for (int i = 0;; ++i) {
+    const std::string number = std::to_string(i);
+    const auto reading = readStatus(path + number, readings);
+    if (!reading) return;
+    addSubstream(card, name + number, *reading, direction, peaks, readings);
+  }
 }
 
 std::optional<PcmReading> SoundHardware::readStatus(const std::string& directory,
@@ -81,13 +83,13 @@ std::optional<PcmReading> SoundHardware::readStatus(const std::string& directory
   note(status.error, readings);
   if (!status.ok()) return std::nullopt;
   PcmReading reading{.status = std::nullopt, .kernel_long_bits = kernel_long_bits_};
-  if (firstWord(status.text).starts_with("closed")) return reading;
+  if (status.text.starts_with("closed")) return reading;
   reading.status = parsePcmStatus(status.text, files_.read(directory + "/hw_params").text);
   return reading;
 }
 
-void SoundHardware::readSubstream(const SoundCard& card, const std::string& name, PcmReading reading,
-                                  const Direction& direction, Peaks& peaks, ChannelReadings& readings) const {
+void SoundHardware::addSubstream(const SoundCard& card, const std::string& name, const PcmReading& reading,
+                                 const Direction& direction, Peaks& peaks, ChannelReadings& readings) const {
   const auto known = direction.peaks.find(name);
   auto history = known == direction.peaks.end() ? std::make_shared<PeakHistory>() : known->second;
   if (reading.status) history->add(reading_number_, reading.status->largest_available);
@@ -98,7 +100,7 @@ void SoundHardware::readSubstream(const SoundCard& card, const std::string& name
                                      .group = std::string(direction.group),
                                      .channel_name = name + " Frames",
                                      .unit_label = "frames"};
-  readings.channels.push_back({description, std::move(reading)});
+  readings.channels.push_back({description, reading});
   description.channel_name = name + ' ' + std::string(direction.peak_name);
   readings.channels.push_back({std::move(description), PeakReading{std::move(history), reading_number_}});
 }

@@ -43,8 +43,10 @@ class SoundHardware {
   };
 
   void readSubstreams(const std::vector<SoundCard>& cards, Direction& direction, ChannelReadings& readings);
-  void readSubstream(const SoundCard& card, const std::string& name, PcmReading reading,
-                     const Direction& direction, Peaks& peaks, ChannelReadings& readings) const;
+  void readDevice(const SoundCard& card, const std::string& device, const Direction& direction, Peaks& peaks,
+                  ChannelReadings& readings) const;
+  void addSubstream(const SoundCard& card, const std::string& name, const PcmReading& reading,
+                    const Direction& direction, Peaks& peaks, ChannelReadings& readings) const;
   /// Nothing where there is no such substream.
   std::optional<PcmReading> readStatus(const std::string& directory, ChannelReadings& readings) const;
   void readInterrupts(const std::vector<SoundCard>& cards, ChannelReadings& readings) const;
