@@ -1,6 +1,5 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
-#include <sqlite3.h>
 
 #include <chrono>
 #include <filesystem>
@@ -8,6 +7,7 @@
 #include <vector>
 
 #include "platform/TemporaryDirectory.h"
+#include "tools/StoreFile.h"
 #include "tools/talctl/CommandFailure.h"
 #include "tools/talctl/EventStore.h"
 #include "tools/talctl/StoreWatch.h"
@@ -17,40 +17,14 @@ namespace {
 
 using testing::ElementsAre;
 
-/// A store as the daemon makes it, as far as events go.
-class Writer {
- public:
-  explicit Writer(const std::filesystem::path& path) {
-    EXPECT_EQ(sqlite3_open(path.c_str(), &database_), SQLITE_OK);
-    execute("PRAGMA journal_mode = WAL");
-    execute(
-        "CREATE TABLE IF NOT EXISTS events(id INTEGER PRIMARY KEY, recorded_at REAL NOT NULL, "
-        "name TEXT NOT NULL, payload TEXT NOT NULL)");
-  }
-  ~Writer() { sqlite3_close(database_); }
-  Writer(const Writer&) = delete;
-  Writer& operator=(const Writer&) = delete;
-
-  void execute(const std::string& sql) {
-    EXPECT_EQ(sqlite3_exec(database_, sql.c_str(), nullptr, nullptr, nullptr), SQLITE_OK) << sql;
-  }
-  void add(double recorded_at, const std::string& name) {
-    execute("INSERT INTO events(recorded_at, name, payload) VALUES (" + std::to_string(recorded_at) + ", '" +
-            name + "', '{}')");
-  }
-
- private:
-  sqlite3* database_ = nullptr;
-};
-
 class EventStoreOfFive : public testing::Test {
  protected:
   EventStoreOfFive() {
-    writer_.add(10, "a.Playback.Start");
-    writer_.add(20, "a.Playback.Stop");
-    writer_.add(15, "b.Record.Start");  // the clock was set back
-    writer_.add(30, "a.Playback.Start");
-    writer_.add(40, "[odd]*");
+    store_file_.add(10, "a.Playback.Start");
+    store_file_.add(20, "a.Playback.Stop");
+    store_file_.add(15, "b.Record.Start");  // the clock was set back
+    store_file_.add(30, "a.Playback.Start");
+    store_file_.add(40, "[odd]*");
   }
 
   std::vector<std::int64_t> ids(const EventQuery& query) {
@@ -61,7 +35,7 @@ class EventStoreOfFive : public testing::Test {
 
   const test::TemporaryDirectory directory_;
   const std::filesystem::path path_ = directory_.path() / "store.db";
-  Writer writer_{path_};
+  StoreFile store_file_{path_};
 };
 
 TEST_F(EventStoreOfFive, AnswersQueriesOldestFirst) {
@@ -84,10 +58,10 @@ TEST_F(EventStoreOfFive, MatchesWholeNamesByGlob) {
   EXPECT_THAT(ids({.name_glob = "' OR 1 --"}), ElementsAre());
 }
 
-TEST_F(EventStoreOfFive, SeesCommitsOfAWriterThatGoesOn) {
+TEST_F(EventStoreOfFive, SeesCommitsOfAStoreFileThatGoesOn) {
   EventStore store(path_);
   EXPECT_EQ(store.newestId(), 5);
-  writer_.add(50, "later");
+  store_file_.add(50, "later");
   EXPECT_EQ(store.newestId(), 6);
   EXPECT_TRUE(store.isCurrent());
   std::filesystem::rename(path_, directory_.path() / "elsewhere.db");
@@ -100,7 +74,7 @@ TEST(EventStore, NeedsAFileButNoTable) {
   EXPECT_THROW(EventStore{path}, CommandFailure);
   EXPECT_FALSE(std::filesystem::exists(path)) << "reading made a store";
 
-  Writer(path).execute("DROP TABLE events");
+  StoreFile(path).execute("DROP TABLE events");
   EventStore store(path);
   EXPECT_EQ(store.newestId(), 0);
   store.forEach({}, [](const StoredEvent&) { ADD_FAILURE(); });
@@ -111,10 +85,10 @@ constexpr std::chrono::seconds kPatience{60};
 
 TEST(StoreWatch, IsWokenByACommit) {
   const test::TemporaryDirectory directory;
-  Writer writer(directory.path() / "store.db");
+  StoreFile file(directory.path() / "store.db");
   StoreWatch watch(directory.path() / "store.db");
   EXPECT_EQ(watch.wait(std::chrono::milliseconds(0), kNobody), StoreWatch::Woken::kTimedOut);
-  writer.add(1, "a");
+  file.add(1, "a");
   EXPECT_EQ(watch.wait(kPatience, kNobody), StoreWatch::Woken::kWritten);
   EXPECT_EQ(watch.wait(std::chrono::milliseconds(0), kNobody), StoreWatch::Woken::kTimedOut);
 }
@@ -122,8 +96,8 @@ TEST(StoreWatch, IsWokenByACommit) {
 TEST(StoreWatch, IsNotWokenByReaders) {
   const test::TemporaryDirectory directory;
   const auto path = directory.path() / "store.db";
-  Writer writer(path);
-  writer.add(1, "a");
+  StoreFile file(path);
+  file.add(1, "a");
   StoreWatch watch(path);
   EXPECT_EQ(EventStore(path).newestId(), 1);
   EXPECT_EQ(watch.wait(std::chrono::milliseconds(0), kNobody), StoreWatch::Woken::kTimedOut);
@@ -138,7 +112,7 @@ TEST(StoreWatch, FollowsDirectoriesThatComeAndGo) {
     std::filesystem::create_directories(state);
     expectWoken();
     {
-      Writer writer(state / "store.db");
+      StoreFile file(state / "store.db");
       expectWoken();
     }
     std::filesystem::remove_all(directory.path() / "deep");

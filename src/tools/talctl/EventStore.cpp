@@ -34,10 +34,10 @@ std::string asUri(std::string_view path) {
   return uri;
 }
 
-std::string columnText(sqlite3_stmt* statement, int column) {
+std::string_view columnText(sqlite3_stmt* statement, int column) {
   const auto* text = static_cast<const char*>(sqlite3_column_blob(statement, column));
   const int bytes = sqlite3_column_bytes(statement, column);
-  return text ? std::string(text, static_cast<std::size_t>(bytes)) : std::string();
+  return text ? std::string_view(text, static_cast<std::size_t>(bytes)) : std::string_view();
 }
 
 }  // namespace
@@ -97,11 +97,14 @@ bool EventStore::step(const Statement& statement) {
 
 bool EventStore::hasEvents() { return step(prepare("SELECT 1 FROM sqlite_master WHERE name = 'events'")); }
 
-std::int64_t EventStore::newestId() {
+std::int64_t EventStore::idFrom(const std::string& sql) {
   if (!hasEvents()) return 0;
-  const Statement statement = prepare("SELECT max(id) FROM events");
+  const Statement statement = prepare(sql);
   return step(statement) ? sqlite3_column_int64(statement.get(), 0) : 0;
 }
+
+std::int64_t EventStore::newestId() { return idFrom("SELECT max(id) FROM events"); }
+std::int64_t EventStore::oldestId() { return idFrom("SELECT min(id) FROM events"); }
 
 void EventStore::forEach(const EventQuery& query, const std::function<void(const StoredEvent&)>& function) {
   if (!hasEvents()) return;

@@ -10,17 +10,19 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <string_view>
 
 struct sqlite3;
 struct sqlite3_stmt;
 
 namespace tal::talctl {
 
+/// The texts are the store's own: they last as long as the call that shows them.
 struct StoredEvent {
   std::int64_t id;
   double recorded_at;  ///< Seconds since 1970.
-  std::string name;
-  std::string payload;  ///< JSON, an object.
+  std::string_view name;
+  std::string_view payload;  ///< JSON, an object.
 };
 
 /// Which events; all conditions hold together.
@@ -42,6 +44,9 @@ class EventStore {
   /// The newest event's ID; 0 where there is none, or no table for them yet.
   std::int64_t newestId();
 
+  /// The oldest event's ID; 0 where there is none.
+  std::int64_t oldestId();
+
   /// Calls `function` for every such event, the oldest first.
   void forEach(const EventQuery& query, const std::function<void(const StoredEvent&)>& function);
 
@@ -60,6 +65,8 @@ class EventStore {
 
   Database open(bool immutable) const;
   bool hasEvents();
+  /// What the query finds; 0 without events.
+  std::int64_t idFrom(const std::string& sql);
   Statement prepare(const std::string& sql);
   /// True for a row, false at the end.
   bool step(const Statement& statement);
