@@ -12,6 +12,7 @@ namespace tal::talctl {
 namespace {
 
 constexpr std::size_t kColumnGap = 2;
+constexpr std::size_t kNarrowestText = 6;
 constexpr std::string_view kEllipsis = "…";
 
 /// One character, or one byte that begins none.
@@ -133,7 +134,12 @@ std::vector<std::string> wrapWords(const std::vector<std::string>& words, Width 
   return lines;
 }
 
-Table::Table(std::vector<std::string> heading) { rows_.push_back(std::move(heading)); }
+Table::Table(std::vector<std::string> heading) {
+  right_.resize(heading.size());
+  rows_.push_back(std::move(heading));
+}
+
+void Table::alignRight(std::size_t column) { right_.at(column) = true; }
 
 void Table::addRow(const std::vector<std::string>& cells) {
   assert(cells.size() == rows_.front().size());
@@ -149,12 +155,24 @@ std::vector<std::size_t> Table::columnWidths(Width width) const {
   if (!width) return widths;
   std::size_t total = std::accumulate(widths.begin(), widths.end(), kColumnGap * (widths.size() - 1));
   while (total > *width) {
-    const auto widest = std::max_element(widths.begin(), widths.end());
-    if (*widest <= 1) break;
-    --*widest;
+    std::size_t& widest = widths[columnToNarrow(widths)];
+    if (widest <= 1) break;
+    --widest;
     --total;
   }
   return widths;
+}
+
+/// The widest one; of numbers only where all others have become too narrow to mean anything.
+std::size_t Table::columnToNarrow(const std::vector<std::size_t>& widths) const {
+  const auto rank = [&](std::size_t column) {
+    return std::pair(!right_[column] && widths[column] > kNarrowestText, widths[column]);
+  };
+  std::size_t chosen = 0;
+  for (std::size_t column = 1; column < widths.size(); ++column) {
+    if (rank(column) > rank(chosen)) chosen = column;
+  }
+  return chosen;
 }
 
 std::string Table::text(Width width) const {
@@ -164,8 +182,9 @@ std::string Table::text(Width width) const {
     std::string line;
     for (std::size_t i = 0; i < row.size(); ++i) {
       const std::string cell = cutToWidth(row[i], widths[i]);
-      line += cell;
-      line.append(widths[i] - displayWidth(cell) + kColumnGap, ' ');
+      const std::string blanks(widths[i] - displayWidth(cell), ' ');
+      line += right_[i] ? blanks + cell : cell + blanks;
+      line.append(kColumnGap, ' ');
     }
     line.erase(line.find_last_not_of(' ') + 1);
     out += line + '\n';

@@ -35,6 +35,9 @@ class Table {
  public:
   explicit Table(std::vector<std::string> heading);
 
+  /// Numbers stand below one another with their ends, and are cut last of all; columns count from 0.
+  void alignRight(std::size_t column);
+
   /// One cell for each column of the heading. Cells are escaped here.
   void addRow(const std::vector<std::string>& cells);
 
@@ -43,8 +46,10 @@ class Table {
 
  private:
   std::vector<std::size_t> columnWidths(Width width) const;
+  std::size_t columnToNarrow(const std::vector<std::size_t>& widths) const;
 
   std::vector<std::vector<std::string>> rows_;
+  std::vector<bool> right_;
 };
 
 }  // namespace tal::talctl

@@ -17,6 +17,7 @@
 #include "tools/talctl/NotifyCommand.h"
 #include "tools/talctl/PerfCommand.h"
 #include "tools/talctl/ReplayCommand.h"
+#include "tools/talctl/ReportCommand.h"
 #include "tools/talctl/SettingsCommand.h"
 #include "tools/talctl/Terminal.h"
 
@@ -33,6 +34,7 @@ struct CommandLine {
   bool json = false;
   SendOptions send;
   EventsOptions events;
+  ReportOptions report;
   std::string script;
   std::vector<std::string> files;
   std::string notification;
@@ -88,6 +90,18 @@ void addEvents(CLI::App& app, CommandLine& line) {
     line.run = [&line](const auto& daemon, const auto& terminal) {
       line.events.json = line.json;
       runEvents(daemon, line.events, terminal);
+    };
+  });
+}
+
+void addReport(CLI::App& app, CommandLine& line) {
+  CLI::App* command = app.add_subcommand("report", "Who played and recorded what, how long, how loud");
+  command->add_option("--since", line.report.since, "Only so far back, such as 90s, 10m, 2h, 7d");
+  command->add_option("--html", line.report.html,
+                      "Write a page for a browser to this file; - for standard output");
+  command->callback([&line] {
+    line.run = [&line](const auto& daemon, const auto& terminal) {
+      runReport(daemon, line.report, terminal);
     };
   });
 }
@@ -160,6 +174,7 @@ int run(int argc, char** argv) {
   addSend(app, line);
   addReplay(app, line);
   addEvents(app, line);
+  addReport(app, line);
   addNotify(app, line);
   addSettings(app, line);
   addPerf(app, line);
