@@ -18,16 +18,15 @@ constexpr std::chrono::nanoseconds kStopTimeout = 180s;
 TalReportingSessionTraceWorker::TalReportingSessionTraceWorker(TalReportingSession& session,
                                                                const TracingPlatform& tracing,
                                                                SkeinClasses& skein)
-    : session_(session),
-      tracing_(tracing),
-      skein_(skein),
-      events_(std::make_shared<TraceEvents>(tracing.make_semaphore(), session.platform().log.trace)) {
+    : session_(session), tracing_(tracing), skein_(skein) {
   if (session_.configuration().contains(kSkeinOutputFileNameKey)) {
     perf_data_name_ = configured(kSkeinOutputFileNameKey);
   }
 }
 
-TalReportingSessionTraceWorker::~TalReportingSessionTraceWorker() { events_->abandon(); }
+TalReportingSessionTraceWorker::~TalReportingSessionTraceWorker() {
+  if (events_) events_->abandon();
+}
 
 std::string TalReportingSessionTraceWorker::configured(const MessageKey& key) const {
   const MessageValue* value = session_.configuration().find(key);
@@ -51,6 +50,7 @@ std::optional<bool> TalReportingSessionTraceWorker::start() {
       configured(kTraceTypeKey) == kTraceTypeProfile ? Template::kProfiling : Template::kDefault);
   configuration->compression = false;
   auto session = tracing_.perftrail.makeSession(*configuration);
+  if (!events_) events_ = std::make_shared<TraceEvents>(tracing_.make_semaphore(), log());
   session->setDelegate(events_);
   events_->begin(std::move(configuration), session);
 

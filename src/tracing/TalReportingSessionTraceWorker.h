@@ -107,7 +107,7 @@ class TalReportingSessionTraceWorker final : public TalReportingSessionWorker {
   TalReportingSession& session_;
   const TracingPlatform& tracing_;
   SkeinClasses& skein_;
-  const std::shared_ptr<TraceEvents> events_;
+  std::shared_ptr<TraceEvents> events_;  // from the first recording on: most sessions have none
   bool started_tracing_ = false;
 
   static constexpr int kResultsVersion = 4;
