@@ -8,6 +8,7 @@
 #include <filesystem>
 #include <system_error>
 
+#include "core/SafeFileName.h"
 #include "core/TalReportingUtility.h"
 #include "tracing/ProbeList.h"
 #include "tracing/TraceConfiguration.h"
@@ -201,9 +202,7 @@ std::string TalReportingSessionTraceWorker::outputFileName() const {
   name += '-';
   name += kProjectName;
   name += '-';
-  std::string application = TalReportingUtilityRetrieveAppName(session_.configuration()).text();
-  std::replace(application.begin(), application.end(), '/', '_');
-  name += application;
+  name += safeInFileName(TalReportingUtilityRetrieveAppName(session_.configuration()).text());
   name += '-';
   name += session_.serviceName();
   return name + ".pdj";
@@ -260,7 +259,8 @@ void TalReportingSessionTraceWorker::writeResults() {
   } else {
     TAL_LOG(log(), "Moving file from tempWriterPath: ", temp_writer_path_, " to ", full_writer_path_);
     if (const auto move_error = results_directory_->move(kTemporaryFile, output_file_)) {
-      TAL_LOG_ERROR(log(), "Failed to move file: ", *move_error);
+      TAL_LOG_ERROR(log(), "Failed to move file");
+      TAL_LOG(log(), "moving ", full_writer_path_, " into place: ", *move_error);
     }
   }
   writer_.reset();

@@ -211,7 +211,7 @@ TEST_F(TraceWorker, FailuresOnTheWayToTheResultsAreLoggedOnce) {
        "can't create logging directory at /log/Audio/Traces: read-only", false},
       {"file refused", [](auto& t) { t.results.write_error = "disk full"; },
        "Failed to write file /log/Audio/Traces/temp_perfdata.pdj: disk full", true},
-      {"move refused", [](auto& t) { t.results.move_error = "in use"; }, "Failed to move file: in use", true},
+      {"move refused", [](auto& t) { t.results.move_error = "in use"; }, "Failed to move file", true},
       {"events lost", [](auto& t) { t.skein.discarded = 12; },
        "the trace lacks 12 events that the tracer had no room for: /", true},
   };

@@ -77,7 +77,8 @@ std::string HelperProcess::spawn(const std::filesystem::path& program,
     return name + ": " + reasonOf(error);
   }
   const std::lock_guard lock(input_mutex_);
-  input_ = std::move(to_helper.write_end);
+  // Given up before it ran, it finds its input at the end.
+  if (!was_given_up_) input_ = std::move(to_helper.write_end);
   output_ = std::move(from_helper.read_end);
   return "";
 }
@@ -133,6 +134,7 @@ void HelperProcess::giveUp() {
   {
     const std::lock_guard lock(input_mutex_);
     input_ = FileDescriptor();
+    was_given_up_ = true;
   }
   constexpr std::uint64_t kOne = 1;
   if (::write(given_up_.get(), &kOne, sizeof kOne) < 0) return;

@@ -39,6 +39,7 @@ class HelperProcess {
   FileDescriptor output_;
   std::mutex input_mutex_;
   FileDescriptor input_;
+  bool was_given_up_ = false;
   pid_t process_ = -1;
 };
 
