@@ -48,6 +48,7 @@ class RowChunk {
       visit(StoreRow{.table = header.table,
                      .recorded_at = header.recorded_at,
                      .number = header.number,
+                     .detail = header.detail,
                      .name = {name, header.name_size},
                      .payload = {payload, header.payload_size}});
       at += sizeof header + header.name_size + header.payload_size;
@@ -58,6 +59,7 @@ class RowChunk {
   struct Header {
     double recorded_at;
     std::int64_t number;
+    std::int64_t detail;
     std::uint32_t name_size;
     std::uint32_t payload_size;
     StoreTable table;
@@ -72,6 +74,7 @@ class RowChunk {
 inline void RowChunk::append(const StoreRow& row) {
   const Header header{.recorded_at = row.recorded_at,
                       .number = row.number,
+                      .detail = row.detail,
                       .name_size = static_cast<std::uint32_t>(row.name.size()),
                       .payload_size = static_cast<std::uint32_t>(row.payload.size()),
                       .table = row.table};

@@ -16,10 +16,11 @@ bool isPassing(int code) { return code == SQLITE_FULL || code == SQLITE_BUSY || 
 
 }  // namespace
 
-SqliteConnection::SqliteConnection(const std::filesystem::path& path) {
+SqliteConnection::SqliteConnection(const std::filesystem::path& path, Access access) {
   // One thread at a time: its own locks are not needed.
-  constexpr int kFlags = SQLITE_OPEN_READWRITE | SQLITE_OPEN_NOMUTEX;
-  if (sqlite3_open_v2(path.c_str(), &handle_, kFlags, nullptr) != SQLITE_OK) {
+  const int flags =
+      (access == Access::kReadOnly ? SQLITE_OPEN_READONLY : SQLITE_OPEN_READWRITE) | SQLITE_OPEN_NOMUTEX;
+  if (sqlite3_open_v2(path.c_str(), &handle_, flags, nullptr) != SQLITE_OK) {
     const std::string reason = handle_ ? sqlite3_errmsg(handle_) : "out of memory";
     sqlite3_close(handle_);
     throw StoreError(StoreError::Cause::kLasting, reason);
@@ -51,6 +52,8 @@ std::string SqliteConnection::text(const char* sql) {
   return statement.step() ? std::string(statement.textAt(0)) : std::string();
 }
 
+std::int64_t SqliteConnection::changedRows() const { return sqlite3_changes64(handle_); }
+
 void SqliteConnection::rollBack() noexcept {
   if (!sqlite3_get_autocommit(handle_)) sqlite3_exec(handle_, "ROLLBACK", nullptr, nullptr, nullptr);
 }
@@ -66,6 +69,8 @@ SqliteStatement::~SqliteStatement() { sqlite3_finalize(statement_); }
 void SqliteStatement::check(int result) const {
   if (result != SQLITE_OK) connection_.fail();
 }
+
+int SqliteStatement::parameterCount() const { return sqlite3_bind_parameter_count(statement_); }
 
 void SqliteStatement::bind(int index, double value) { check(sqlite3_bind_double(statement_, index, value)); }
 

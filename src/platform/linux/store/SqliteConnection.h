@@ -18,8 +18,10 @@ namespace tal {
 /// One open database file. One thread at a time. Errors are StoreErrors.
 class SqliteConnection {
  public:
-  /// Opens a file that exists, for writing.
-  explicit SqliteConnection(const std::filesystem::path& path);
+  enum class Access { kReadWrite, kReadOnly };
+
+  /// Opens a file that exists.
+  explicit SqliteConnection(const std::filesystem::path& path, Access access = Access::kReadWrite);
   SqliteConnection(const SqliteConnection&) = delete;
   SqliteConnection& operator=(const SqliteConnection&) = delete;
   ~SqliteConnection();
@@ -31,6 +33,9 @@ class SqliteConnection {
   /// The first column of the statement's first row.
   std::int64_t integer(const char* sql);
   std::string text(const char* sql);
+
+  /// How many rows the last statement that changes any has changed.
+  std::int64_t changedRows() const;
 
   /// Ends a transaction that failed, if there is one.
   void rollBack() noexcept;
@@ -49,6 +54,9 @@ class SqliteStatement {
   SqliteStatement(const SqliteStatement&) = delete;
   SqliteStatement& operator=(const SqliteStatement&) = delete;
   ~SqliteStatement();
+
+  /// The highest parameter that the statement has.
+  int parameterCount() const;
 
   /// Parameters count from 1. Texts and blobs must stay until the end of `run`.
   void bind(int index, double value);

@@ -112,16 +112,37 @@ void StoreCommitter::maintainForAMoment() {
 void StoreCommitter::carryOutSteps() {
   const double now = dependencies_.clock.secondsSince1970();
   const auto nextStep = [&] { return nextRetentionStep(database_->retentionState(now), settings_.limits); };
+  const auto outboxIsOver = [&] { return database_->outboxIsOver(settings_.most_outbox_bytes); };
+  bool outbox_is_over = outboxIsOver();
   RetentionStep step = nextStep();
-  if (step.action == RetentionStep::Action::kNothing) return;
+  const auto isUnfinished = [&] { return outbox_is_over || step.action != RetentionStep::Action::kNothing; };
+  if (!isUnfinished()) return;
   const auto end = std::chrono::steady_clock::now() + kMoment;
   database_->begin();
-  while (step.action != RetentionStep::Action::kNothing && std::chrono::steady_clock::now() < end) {
-    database_->carryOut(step);
+  while (isUnfinished() && std::chrono::steady_clock::now() < end) {
+    if (outbox_is_over) {
+      database_->trimOutbox(settings_.most_outbox_bytes);
+      outbox_is_over = outboxIsOver();
+    } else {
+      database_->carryOut(step);
+    }
     step = nextStep();
   }
   database_->commit();
-  maintenance_unfinished_ = step.action != RetentionStep::Action::kNothing;
+  maintenance_unfinished_ = isUnfinished();
+  outbox_losses_ += database_->takeOutboxLosses();
+  if (outbox_losses_ > 0 && outbox_lines_.allows(dependencies_.clock.monotonic())) tellOfOutboxLosses();
+}
+
+void StoreCommitter::tellOfOutboxLosses() {
+  TAL_LOG_ERROR(dependencies_.log, outbox_losses_,
+                " messages for brokers were given up, the oldest: the outbox is full or they are too old");
+  outbox_losses_ = 0;
+}
+
+void StoreCommitter::close() {
+  database_.reset();
+  if (outbox_losses_ > 0) tellOfOutboxLosses();
 }
 
 }  // namespace tal

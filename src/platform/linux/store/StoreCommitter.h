@@ -51,11 +51,12 @@ class StoreCommitter {
   void maintainForAMoment();
 
   /// Moves the log into the file and closes it.
-  void close() { database_.reset(); }
+  void close();
 
  private:
   void insertReport(const GivenUpRows& given_up);
   void carryOutSteps();
+  void tellOfOutboxLosses();
   void noteFailure(const StoreError& error);
   void noteSuccess(const GivenUpRows& given_up);
 
@@ -66,6 +67,8 @@ class StoreCommitter {
   std::unique_ptr<StoreDatabase> database_;  // none after a lasting failure
   unsigned failures_ = 0;
   OncePerMinute failure_lines_;
+  std::int64_t outbox_losses_ = 0;  // not told yet
+  OncePerMinute outbox_lines_;
   Clock::Instant maintained_at_{};
   std::size_t bytes_since_maintenance_ = 0;
   bool maintenance_unfinished_ = true;

@@ -19,6 +19,19 @@ const std::filesystem::path& made(const std::filesystem::path& path) {
   return path;
 }
 
+// Binds what of the row the statement has a place for.
+void bindRtc(SqliteStatement& statement, const StoreRow& row) {
+  constexpr int kNumber = 2;
+  constexpr int kName = 3;
+  constexpr int kPayload = 4;
+  constexpr int kDetail = 5;
+  const int count = statement.parameterCount();
+  if (count >= kNumber) statement.bind(kNumber, row.number);
+  if (count >= kName) statement.bindText(kName, row.name);
+  if (count >= kPayload) statement.bindText(kPayload, row.payload);
+  if (count >= kDetail) statement.bind(kDetail, row.detail);
+}
+
 // Before any statement is prepared, so that a foreign file is refused as what it is.
 SqliteConnection& checked(SqliteConnection& connection) {
   checkAndMigrateStore(connection);
@@ -31,8 +44,7 @@ SqliteConnection& checked(SqliteConnection& connection) {
 }  // namespace
 
 StoreDatabase::TableStatements::TableStatements(SqliteConnection& connection, const StoreTableSchema& table)
-    : insert(connection, table.insert),
-      first(connection, "SELECT id, recorded_at FROM " + std::string(table.name) + " ORDER BY id LIMIT 1"),
+    : first(connection, "SELECT id, recorded_at FROM " + std::string(table.name) + " ORDER BY id LIMIT 1"),
       last_id(connection, "SELECT max(id) FROM " + std::string(table.name)),
       remove(connection, "DELETE FROM " + std::string(table.name) + " WHERE id <= ?1"),
       remove_older(connection,
@@ -41,6 +53,7 @@ StoreDatabase::TableStatements::TableStatements(SqliteConnection& connection, co
 StoreDatabase::StoreDatabase(const std::filesystem::path& path)
     : connection_(made(path)),
       page_bytes_(checked(connection_).integer("PRAGMA page_size")),
+      rtc_(connection_),
       begin_(connection_, "BEGIN IMMEDIATE"),
       commit_(connection_, "COMMIT"),
       page_count_(connection_, "PRAGMA page_count"),
@@ -53,7 +66,10 @@ StoreDatabase::StoreDatabase(const std::filesystem::path& path)
   connection_.execute("PRAGMA secure_delete=OFF");
   setFullySynchronous(false);
   for (const StoreTableSchema& table : kStoreTables) {
-    tables_.push_back(std::make_unique<TableStatements>(connection_, table));
+    inserts_.push_back(std::make_unique<SqliteStatement>(connection_, table.insert));
+  }
+  for (std::size_t i = 0; i < kGrowingTableCount; ++i) {
+    tables_.push_back(std::make_unique<TableStatements>(connection_, kStoreTables[i]));
   }
   // Touches both ends of every table, so that a file that was cut short is
   // noticed now.
@@ -65,16 +81,19 @@ void StoreDatabase::setFullySynchronous(bool full) {
 }
 
 void StoreDatabase::insert(const StoreRow& row) {
-  SqliteStatement& statement = statementsOf(row.table).insert;
+  SqliteStatement& statement = insertOf(row.table);
   statement.bind(1, row.recorded_at);
   if (row.table != StoreTable::kEvents) statement.bind(2, row.number);
-  if (row.table != StoreTable::kMetrics) {
+  if (row.table >= StoreTable::kRtcMessages) {
+    bindRtc(statement, row);
+  } else if (row.table != StoreTable::kMetrics) {
     statement.bindText(3, row.name);
     statement.bindText(4, row.payload);
   } else {
     statement.bindBlob(4, row.payload);
   }
   statement.run();
+  if (row.table == StoreTable::kRtcConfirmed) rtc_.dropConfirmed();
 }
 
 std::optional<TableSpan> StoreDatabase::spanOf(StoreTable table) {
@@ -91,7 +110,7 @@ std::optional<TableSpan> StoreDatabase::spanOf(StoreTable table) {
 
 RetentionState StoreDatabase::retentionState(double now) {
   spans_.clear();
-  for (std::size_t i = 0; i < kStoreTableCount; ++i) {
+  for (std::size_t i = 0; i < kGrowingTableCount; ++i) {
     if (const auto span = spanOf(static_cast<StoreTable>(i))) spans_.push_back(*span);
   }
   const auto count = [](SqliteStatement& statement) {
@@ -122,6 +141,10 @@ void StoreDatabase::carryOut(const RetentionStep& step) {
   remove.bind(1, step.through_id);
   if (step.recorded_before) remove.bind(2, *step.recorded_before);
   remove.run();
+  if (step.table == StoreTable::kRtcOutbox) rtc_.noteLosses(connection_.changedRows());
+  if (step.table == StoreTable::kRtcOutbox || step.table == StoreTable::kRtcMessages) {
+    rtc_.dropUnusedSessions();
+  }
 }
 
 }  // namespace tal

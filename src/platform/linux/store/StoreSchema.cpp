@@ -17,13 +17,32 @@ constexpr std::int64_t kApplicationId = 0x54414C72;
 
 // Each entry brings a store from the version that is its index to the next one.
 // Entries are never changed once released, only added.
-constexpr std::array<const char*, 1> kMigrations{
+constexpr std::array<const char*, 2> kMigrations{
     "CREATE TABLE events(id INTEGER PRIMARY KEY, recorded_at REAL NOT NULL, name TEXT NOT NULL,"
     " payload TEXT NOT NULL);"
     "CREATE TABLE metrics(id INTEGER PRIMARY KEY, recorded_at REAL NOT NULL, metric INTEGER NOT NULL,"
     " record BLOB NOT NULL);"
     "CREATE TABLE energylog(id INTEGER PRIMARY KEY, recorded_at REAL NOT NULL, class INTEGER NOT NULL,"
-    " name TEXT NOT NULL, payload TEXT NOT NULL);"};
+    " name TEXT NOT NULL, payload TEXT NOT NULL);",
+
+    // Messages name their session by its row, which can go once it has ended and
+    // no message up to its last one is left. The outbox numbers messages for good:
+    // AUTOINCREMENT never uses a number twice, and survives what the row itself
+    // survives. `position` sums the sizes up, so that the outbox's size is the
+    // difference of two rows.
+    "CREATE TABLE rtc_sessions(id INTEGER PRIMARY KEY, recorded_at REAL NOT NULL,"
+    " session_identifier INTEGER NOT NULL, realtime INTEGER NOT NULL, session_info TEXT NOT NULL,"
+    " user_info TEXT NOT NULL, last_row INTEGER, last_number INTEGER);"
+    "CREATE INDEX rtc_sessions_over ON rtc_sessions(last_row) WHERE last_row IS NOT NULL;"
+    "CREATE TABLE rtc_rows(id INTEGER PRIMARY KEY, recorded_at REAL NOT NULL, session INTEGER NOT NULL,"
+    " category INTEGER NOT NULL, type INTEGER NOT NULL, payload TEXT NOT NULL);"
+    "CREATE VIEW rtc_messages AS SELECT r.id, r.recorded_at, s.session_identifier, r.category, r.type,"
+    " s.realtime, s.session_info, s.user_info, r.payload FROM rtc_rows r LEFT JOIN rtc_sessions s"
+    " ON s.id = r.session;"
+    "CREATE TABLE rtc_outbox(id INTEGER PRIMARY KEY AUTOINCREMENT, recorded_at REAL NOT NULL,"
+    " session INTEGER NOT NULL, category INTEGER NOT NULL, type INTEGER NOT NULL, payload TEXT NOT NULL,"
+    " position INTEGER NOT NULL);"
+    "CREATE TABLE rtc_brokers(broker TEXT PRIMARY KEY, confirmed INTEGER NOT NULL) WITHOUT ROWID;"};
 constexpr auto kVersion = static_cast<std::int64_t>(kMigrations.size());
 
 [[noreturn]] void failWithErrno(const std::string& what) {

@@ -8,10 +8,12 @@
 
 namespace tal {
 
-/// What the settings domain "org.vantle.talsys.store" says.
+/// What the settings domain "org.vantle.talsys.store" says, and the size of the
+/// outbox, which "org.vantle.talsys.rtc" does.
 struct StoreSettings {
   RetentionLimits limits;
   bool fully_synchronous = false;
+  std::int64_t most_outbox_bytes = 0;  ///< from the domain of the real-time messages
 };
 
 /// Reads the store's settings again and again. A value that makes no sense is
@@ -25,8 +27,8 @@ class StoreSettingsReader {
   StoreSettings read();
 
  private:
-  std::int64_t positiveNumber(std::string_view key, std::int64_t default_value, std::int64_t most,
-                              std::string& wrong);
+  std::int64_t positiveNumber(std::string_view domain, std::string_view key, std::int64_t default_value,
+                              std::int64_t most, std::string& wrong);
   bool isFullySynchronous(std::string& wrong);
 
   const SettingsStore& settings_;
