@@ -159,6 +159,23 @@ class NoCommandShell final : public CommandShell {
   bool run(const std::string&, const Output&) override { return false; }
 };
 
+/// Queues that forget what they are given: what is measured is the handing over.
+class NoQueues final : public SerialQueuePool {
+ public:
+  std::shared_ptr<SerialQueue> makeQueue(std::string_view) override { return std::make_shared<NoQueue>(); }
+};
+
+class NoCallstat final : public CallstatBackend {
+ public:
+  std::optional<CallstatToken> newHierarchyTokenFromParentToken(const CallstatToken*) override {
+    return std::nullopt;
+  }
+  std::unique_ptr<CallstatSession> initWithSessionInfo(MessageDict, MessageDict,
+                                                       const std::vector<std::string>&) override {
+    return nullptr;
+  }
+};
+
 struct Host {
   NoQueue queue;
   SystemClock clock;
@@ -179,6 +196,8 @@ struct Host {
   NoTapToKite tap_to_kite;
   NoCommandShell command_shell;
   NoCaptures captures;
+  NoQueues queue_pool;
+  NoCallstat callstat;
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
                     .log = log,
@@ -193,6 +212,8 @@ struct Host {
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
                     .driver_stats = driver_stats,
+                    .queue_pool = queue_pool,
+                    .callstat = callstat,
                     .flutter_requests = flutter_requests,
                     .tap_to_kite = tap_to_kite,
                     .command_shell = command_shell,

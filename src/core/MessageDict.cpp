@@ -127,8 +127,12 @@ void MessageDict::merge(const MessageDict& other) {
 }
 
 MessageDict MessageDict::deepCopy() const {
+  const auto isContainer = [](const MessageValue& value) {
+    return value.kind() == MessageValue::Kind::kArray || value.kind() == MessageValue::Kind::kDict;
+  };
+  // Without containers there is nothing that a change could show through.
+  if (!block_ || std::none_of(block_->values(), block_->values() + block_->count, isContainer)) return *this;
   MessageDict copy;
-  if (!block_) return copy;
   copy.block_ = allocate(block_->count + kSpareValues, block_->shape);
   for (std::size_t i = 0; i < block_->count; ++i) {
     new (copy.block_->values() + i) MessageValue(block_->values()[i].deepCopy());

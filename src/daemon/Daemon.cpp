@@ -76,7 +76,12 @@ Daemon::Daemon(const DaemonOptions& options, const std::string& version)
                   .wanted = {.settings = settings_, .log = log_.service, .coarse_now = LinuxClock::coarse}}),
       plume_metrics_(store_, clock_),
       energylog_(store_, clock_),
-      durability_gate_(store_),
+      callstat_({.store = store_,
+                 .store_path = directories_.state / "store.db",
+                 .settings = settings_,
+                 .clock = clock_,
+                 .log = log_.callstat}),
+      durability_gate_(store_, queue_pool_),
       notify_center_(directories_.runtime, log_.service),
       system_state_(clock_, options.host_root),
       diagnostic_log_(directories_.log),
@@ -112,6 +117,8 @@ Daemon::Daemon(const DaemonOptions& options, const std::string& version)
                 .system_state = system_state_,
                 .diagnostic_log = diagnostic_log_,
                 .driver_stats = driver_stats_,
+                .queue_pool = queue_pool_,
+                .callstat = callstat_,
                 .flutter_requests = flutter_requests_,
                 .tap_to_kite = tap_to_kite_,
                 .command_shell = command_shell_,
@@ -165,6 +172,7 @@ TalReportingService::Options Daemon::serviceOptions() {
 
 // On the I/O thread, while others run on: no destructor may run.
 void Daemon::endProcess() {
+  queue_pool_.stop();
   store_.flushAndClose();
   ::_exit(kExitKilled);
 }
@@ -188,6 +196,7 @@ void Daemon::endInOrder() {
   stopped.get_future().wait();
   // Captures that were asked for are still written; timed ones are not waited for.
   if (capture_queue_) capture_queue_->stop();
+  queue_pool_.stop();
   store_.flushAndClose();
   listener_.stop();
   queue_.stop();

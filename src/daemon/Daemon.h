@@ -13,6 +13,7 @@
 #include "daemon/Directories.h"
 #include "daemon/StoreDurabilityGate.h"
 #include "platform/Platform.h"
+#include "platform/linux/callstat/LinuxCallstatBackend.h"
 #include "platform/linux/capture/CaptureService.h"
 #include "platform/linux/diagnostic_log/LinuxDiagnosticLog.h"
 #include "platform/linux/driver_stats/LinuxDriverStatsFeed.h"
@@ -22,6 +23,7 @@
 #include "platform/linux/logging/LogRing.h"
 #include "platform/linux/logging/StderrLogSink.h"
 #include "platform/linux/notify/LinuxNotifyCenter.h"
+#include "platform/linux/process/ElasticQueuePool.h"
 #include "platform/linux/process/InstanceLock.h"
 #include "platform/linux/process/LinuxClock.h"
 #include "platform/linux/process/LinuxProcessTable.h"
@@ -79,6 +81,9 @@ class Daemon {
   StoreAnalyticsSink analytics_;
   StorePlumeMetricSubmitter plume_metrics_;
   StoreEnergylogSink energylog_;
+  LinuxCallstatBackend callstat_;
+  // Destroyed before what its queues' tasks use.
+  ElasticQueuePool queue_pool_;
   StoreDurabilityGate durability_gate_;
   LinuxNotifyCenter notify_center_;
   LinuxSystemState system_state_;

@@ -2,6 +2,7 @@
 
 #include "core/Log.h"
 #include "platform/AnalyticsSink.h"
+#include "platform/CallstatBackend.h"
 #include "platform/Clock.h"
 #include "platform/CommandShell.h"
 #include "platform/DeviceProperties.h"
@@ -13,6 +14,7 @@
 #include "platform/PlumeMetricSubmitter.h"
 #include "platform/ProcessTable.h"
 #include "platform/SerialQueue.h"
+#include "platform/SerialQueuePool.h"
 #include "platform/SettingsStore.h"
 #include "platform/SymptomReporterService.h"
 #include "platform/SystemState.h"
@@ -39,6 +41,8 @@ struct Platform {
   const SystemState& system_state;
   DiagnosticLog& diagnostic_log;
   DriverStatsFeed& driver_stats;
+  SerialQueuePool& queue_pool;
+  CallstatBackend& callstat;
   FlutterRequestService& flutter_requests;
   TapToKiteService& tap_to_kite;
   CommandShell& command_shell;

@@ -17,6 +17,7 @@
 #include "workers/sinks/TalReportingSessionDPWorker.h"
 #include "workers/sinks/TalReportingSessionEnergylogWorker.h"
 #include "workers/sinks/TalReportingSessionPlumeWorker.h"
+#include "workers/sinks/TalReportingSessionRtcWorker.h"
 #include "workers/sinks/TalReportingSessionSummaryJsonFileWorker.h"
 #include "workers/sinks/TalReportingSessionSummaryWorker.h"
 #include "workers/sinks/TalReportingSessionTallyWorker.h"
@@ -29,7 +30,6 @@ using Traits = TalReportingSessionWorkerClass::Traits;
 
 constexpr Traits kNeither{};
 constexpr Traits kConsumer{.is_consumer = true};
-constexpr Traits kSingleMessageConsumer{.is_consumer = true, .handle_single_message_session = true};
 
 std::unique_ptr<TalReportingSessionWorkerClass> declining(std::string_view name, Traits traits) {
   return std::make_unique<DecliningWorkerClass>(name, traits);
@@ -60,7 +60,7 @@ std::unique_ptr<WorkerRoster> makeWorkerRoster(const Platform& platform,
   classes.push_back(std::make_unique<TalReportingSessionDPWorkerClass>(platform));
   classes.push_back(std::make_unique<TalReportingSessionSummaryJsonFileWorkerClass>());
   classes.push_back(declining("TalReportingSessionAudioRegistrationWorker", kConsumer));
-  classes.push_back(declining("TalReportingSessionRtcWorker", kSingleMessageConsumer));
+  classes.push_back(std::make_unique<TalReportingSessionRtcWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionTapToKiteWorkerClass>());
   return std::make_unique<WorkerRoster>(std::move(classes), platform.log.session);
 }

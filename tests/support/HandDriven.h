@@ -73,6 +73,12 @@ class HandQueue final : public SerialQueue {
     clock_.advance(end - clock_.monotonic());
   }
 
+  /// Ends what tasks and queue may hold of each other.
+  void dropAll() {
+    const auto ready = std::exchange(ready_, {});
+    const auto timers = std::exchange(timers_, {});
+  }
+
   std::size_t waitingTimers() const { return timers_.size(); }
 
  private:

@@ -15,6 +15,7 @@
 
 #include "core/Log.h"
 #include "platform/Platform.h"
+#include "support/FakeCallstatBackend.h"
 #include "support/FakeCommandShell.h"
 #include "support/FakeDriverStatsFeed.h"
 #include "support/FakeFlutterRequestService.h"
@@ -186,6 +187,8 @@ struct TestPlatform {
   FakeFlutterRequestService flutter_requests;
   FakeTapToKiteService tap_to_kite;
   FakeCommandShell command_shell;
+  HandQueuePool queue_pool{clock};
+  FakeCallstatBackend callstat;
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
                     .log = channels,
@@ -200,6 +203,8 @@ struct TestPlatform {
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
                     .driver_stats = driver_stats,
+                    .queue_pool = queue_pool,
+                    .callstat = callstat,
                     .flutter_requests = flutter_requests,
                     .tap_to_kite = tap_to_kite,
                     .command_shell = command_shell};

@@ -48,6 +48,8 @@ TEST(SystemMonitorOnLinux, ANewDeviceNameReachesEveryRunningSessionAtItsNotifica
                           .system_state = host.system_state,
                           .diagnostic_log = host.diagnostic_log,
                           .driver_stats = host.driver_stats,
+                          .queue_pool = host.queue_pool,
+                          .callstat = host.callstat,
                           .flutter_requests = host.flutter_requests,
                           .tap_to_kite = host.tap_to_kite,
                           .command_shell = host.command_shell};

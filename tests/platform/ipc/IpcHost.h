@@ -139,6 +139,9 @@ class IpcHost {
   FakeFlutterRequestService flutter_requests;
   FakeTapToKiteService tap_to_kite;
   FakeCommandShell command_shell;
+  HandClock idle_clock;
+  HandQueuePool queue_pool{idle_clock};
+  FakeCallstatBackend callstat;
   ReportingQueue queue{"test"};
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
@@ -154,6 +157,8 @@ class IpcHost {
                     .system_state = system_state,
                     .diagnostic_log = diagnostic_log,
                     .driver_stats = driver_stats,
+                    .queue_pool = queue_pool,
+                    .callstat = callstat,
                     .flutter_requests = flutter_requests,
                     .tap_to_kite = tap_to_kite,
                     .command_shell = command_shell};
