@@ -22,6 +22,8 @@ class LinuxCallstatBackendTest : public test::StoreFixture {
   }
   /// A daemon begins.
   void open() {
+    if (store_) earlier_stores_.push_back(std::move(store_));
+    if (backend_) earlier_backends_.push_back(std::move(backend_));
     store_ = std::make_unique<StoreWriter>(StoreWriter::Dependencies{
         .directory = directory_.path(), .settings = settings_, .clock = clock_, .log = log_.service});
     backend_ =
@@ -43,6 +45,9 @@ class LinuxCallstatBackendTest : public test::StoreFixture {
     return test::OtherProgram(storePath()).query("SELECT " + columns + " FROM rtc_messages ORDER BY id");
   }
 
+  // For sessions that a daemon did not end: closed, they take nothing more.
+  std::vector<std::unique_ptr<StoreWriter>> earlier_stores_;
+  std::vector<std::unique_ptr<LinuxCallstatBackend>> earlier_backends_;
   std::unique_ptr<StoreWriter> store_;
   std::unique_ptr<LinuxCallstatBackend> backend_;
   std::vector<std::string> found_;
