@@ -39,7 +39,7 @@ class TapToKiteService {
 
   /// Makes the draft and shows it. `process_name` is the program that the report
   /// is about, where it is known; `display_reason` tells the user why he is asked.
-  /// `completion` is called once, on a thread of the service's own.
+  /// `completion` is called once, on any thread.
   virtual void createDraft(KiteDraft draft, std::optional<std::string> process_name,
                            std::string display_reason, Completion completion) = 0;
 };

@@ -6,39 +6,13 @@ import shutil
 import subprocess
 import unittest
 
-import talreporting
-from tal_harness import DaemonTest, GENERIC, PLAYBACK
+from tal_harness import DaemonTest, PLAYBACK
 
 IO, ERROR_TYPE = 7, 6
 MEMORY_LOG = 19
 WORKER_SETTINGS = "settings/org.vantle.talsys.talreporting.toml"
 PROMPTS = {"device.toml": "InternalBuild = true\n", WORKER_SETTINGS: "ParleyInvalidXyBackOffSeconds = 3600.0\n"}
 OVERLOAD = {"smallest_buffer_frame_size": 512, "io_cycle": 9}
-
-
-class CustomerBuild(DaemonTest):
-    config = {WORKER_SETTINGS: "enable_flutter = true\n"}
-
-    def test_an_overload_is_an_event_and_nothing_else(self):
-        client = self.connect()
-        client.create_reporting_session(7)
-        client.start_reporting_session(7)
-        client.send_message(OVERLOAD, IO, ERROR_TYPE, [7])
-        self.assertEqual(len(self.daemon.events("org.vantle.talsys.IO.Error")), 1)
-        self.assertFalse((self.daemon.root / "run/notify/org.vantle.talsys.dropped-flutter").exists())
-
-    def test_memory_is_logged_for_test_sessions_alone(self):
-        client = self.connect()
-        client.create_reporting_session(7)
-        client.start_reporting_session(7)
-        client.send_message({"n": 1}, GENERIC, MEMORY_LOG, [7])
-        self.daemon.settle()
-        self.assertNotIn("wiredlog:", self.daemon.log())
-        client.set_service_type(7, talreporting.SERVICE_TYPES["test"])
-        client.start_reporting_session(7)
-        client.send_message({"n": 2}, GENERIC, MEMORY_LOG, [7])
-        self.daemon.settle()
-        self.assertIn("wiredlog: request talresources captured", self.daemon.log())
 
 
 def send_invalid_coordinates(client, reporter):

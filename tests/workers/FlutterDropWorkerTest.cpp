@@ -156,14 +156,5 @@ TEST_F(FlutterDropWorker, SleepsBeforeTheCaptureAsLongAsASettingSays) {
   }
 }
 
-TEST_F(FlutterDropWorker, SaysWhyItDidNotDrop) {
-  make();
-  overload({{"smallest_buffer_frame_size", 12}, {"io_cycle", 3}}, AudioEventCategory::kPlayback);
-  EXPECT_TRUE(host.log.holds("Value of io_buffer_size is (null)"));
-  EXPECT_TRUE(
-      host.log.holds("right conditions not met: buffer size : 12, time diff : 1800000000.000000, "
-                     "io cycle: 3"));
-}
-
 }  // namespace
 }  // namespace tal
