@@ -5,12 +5,15 @@
 
 #include <CLI/CLI.hpp>
 #include <cstdio>
-#include <iostream>
+#include <exception>
 #include <string>
 
 #include "tools/talresources/Listing.h"
 
 namespace {
+
+constexpr int kFailed = 1;
+constexpr int kWrongUsage = 2;
 
 // The daemon serves nobody while it waits for a listing, and the memory of a
 // process that hangs in the kernel can take for ever to read.
@@ -29,9 +32,7 @@ void writeOut(std::string_view text) {
   std::fflush(stdout);
 }
 
-}  // namespace
-
-int main(int argument_count, char** arguments) {
+int run(int argument_count, char** arguments) {
   CLI::App app("Lists the resources that each process uses.", "talresources");
   app.footer(kColumns);
   app.set_version_flag("--version", std::string("talresources ") + TAL_VERSION);
@@ -42,8 +43,7 @@ int main(int argument_count, char** arguments) {
   try {
     app.parse(argument_count, arguments);
   } catch (const CLI::ParseError& error) {
-    constexpr int kExitWrongUsage = 2;
-    return app.exit(error) == 0 ? 0 : kExitWrongUsage;
+    return app.exit(error) == 0 ? 0 : kWrongUsage;
   }
   ::alarm(kMostSeconds);
   if (!zones) {
@@ -51,6 +51,17 @@ int main(int argument_count, char** arguments) {
     return 0;
   }
   const auto error = tal::listZones(proc, writeOut);
-  if (error) std::cerr << "talresources: " << *error << '\n';
-  return error ? 1 : 0;
+  if (error) std::fprintf(stderr, "talresources: %s\n", error->c_str());
+  return error ? kFailed : 0;
+}
+
+}  // namespace
+
+int main(int argument_count, char** arguments) {
+  try {
+    return run(argument_count, arguments);
+  } catch (const std::exception& error) {
+    std::fprintf(stderr, "talresources: %s\n", error.what());
+    return kFailed;
+  }
 }

@@ -29,7 +29,7 @@ std::optional<std::string> showDesktopNotification(const DesktopNotification& no
   if (const int status = sd_bus_open_user(&opened); status < 0) return "no session bus: " + reasonOf(status);
   const std::unique_ptr<sd_bus, CloseBus> bus(opened);
   sd_bus_set_method_call_timeout(bus.get(), kMostMicrosecondsPerCall);
-  sd_bus_error error = SD_BUS_ERROR_NULL;
+  sd_bus_error error{};
   // Name of the program, what it replaces, icon, title, body, actions, hints, expiry.
   const int status =
       sd_bus_call_method(bus.get(), "org.freedesktop.Notifications", "/org/freedesktop/Notifications",
