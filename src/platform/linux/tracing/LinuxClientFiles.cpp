@@ -5,8 +5,7 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdio>
-#include <optional>
+#include <memory>
 #include <system_error>
 #include <utility>
 
@@ -25,7 +24,8 @@ std::string reasonOf(int error) { return std::generic_category().message(error);
 
 class LinuxResultsDirectory final : public ResultsDirectory {
  public:
-  LinuxResultsDirectory(FileDescriptor directory, std::optional<ClientIdentity> client)
+  /// Without a client: the daemon's own directory.
+  LinuxResultsDirectory(FileDescriptor directory, std::unique_ptr<const ClientIdentity> client)
       : directory_(std::move(directory)), client_(std::move(client)) {}
 
   DiagnosticLog::Opened createFile(std::string_view name) override {
@@ -65,7 +65,7 @@ class LinuxResultsDirectory final : public ResultsDirectory {
   }
 
   const FileDescriptor directory_;
-  const std::optional<ClientIdentity> client_;
+  const std::unique_ptr<const ClientIdentity> client_;
 };
 
 ClientFiles::Contents readAll(int held, std::size_t most_bytes) {
@@ -118,7 +118,8 @@ ClientFiles::OpenedDirectory LinuxClientFiles::openDirectory(const ClientIdentit
   if (!S_ISDIR(walk.status().st_mode)) return {nullptr, "it is no directory"};
   if (!walk.may(Right::kWrite) || !walk.may(Right::kSearch))
     return {nullptr, "the client may not write to it"};
-  return {std::make_unique<LinuxResultsDirectory>(walk.release(), *client), ""};
+  return {std::make_unique<LinuxResultsDirectory>(walk.release(), std::make_unique<ClientIdentity>(*client)),
+          ""};
 }
 
 ClientFiles::OpenedDirectory LinuxClientFiles::openDiagnosticDirectory(std::string_view place) {
@@ -129,7 +130,7 @@ ClientFiles::OpenedDirectory LinuxClientFiles::openDiagnosticDirectory(std::stri
         ::openat(directory.get(), part.c_str(), O_PATH | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   }
   if (!directory) return {nullptr, reasonOf(errno)};
-  return {std::make_unique<LinuxResultsDirectory>(std::move(directory), std::nullopt), ""};
+  return {std::make_unique<LinuxResultsDirectory>(std::move(directory), nullptr), ""};
 }
 
 }  // namespace tal
