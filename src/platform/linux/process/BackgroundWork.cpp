@@ -1,6 +1,7 @@
 #include "platform/linux/process/BackgroundWork.h"
 
 #include <pthread.h>
+#include <sys/resource.h>
 
 #include <system_error>
 #include <utility>
@@ -40,6 +41,8 @@ bool BackgroundWork::startThread() {
 
 void BackgroundWork::run() {
   pthread_setname_np(pthread_self(), thread_name_.c_str());
+  // Not at the raised priority of a queue that may have started it.
+  setpriority(PRIO_PROCESS, 0, 0);
   std::unique_lock lock(mutex_);
   while (!tasks_.empty()) {
     Task task = std::move(tasks_.front());
