@@ -13,8 +13,19 @@
 #include "platform/linux/skein/TraceReader.h"
 #include "platform/linux/tracing/SkeinLibraryLoader.h"
 
+#ifdef __SANITIZE_ADDRESS__
+#include <sanitizer/lsan_interface.h>
+#endif
+
 namespace tal {
 namespace {
+
+// The reading library's parser forgets a few bytes of a description that it cannot make sense of.
+#ifdef __SANITIZE_ADDRESS__
+using ReadingLibraryLeaks = __lsan::ScopedDisabler;
+#else
+struct ReadingLibraryLeaks {};
+#endif
 
 namespace fs = std::filesystem;
 using test::writeFile;
@@ -129,8 +140,7 @@ TEST_F(TraceReader, RefusesWhatIsDamaged) {
                       {"cut within the head", good.substr(0, 10), kMetadata},
                       {"size flipped", flipped, kMetadata},
                       {"unknown event", unknown, kMetadata},
-                      {"no description", good, ""},
-                      {"damaged description", good, std::string(kMetadata).substr(0, 700)}};
+                      {"no description", good, ""}};
   for (const Row& row : rows) {
     writeTrace(row.stream, row.metadata);
     const auto result = readTrace(directory.path().string());
@@ -140,6 +150,14 @@ TEST_F(TraceReader, RefusesWhatIsDamaged) {
   }
   fs::remove_all(place());
   EXPECT_EQ(readTrace(directory.path().string()).error, "no trace lies in " + directory.path().string());
+}
+
+TEST_F(TraceReader, RefusesADamagedDescription) {
+  [[maybe_unused]] const ReadingLibraryLeaks allowed{};
+  writeTrace(good, std::string(kMetadata).substr(0, 700));
+  const auto result = readTrace(directory.path().string());
+  EXPECT_FALSE(result.model);
+  EXPECT_FALSE(result.error.empty());
 }
 
 TEST_F(TraceReader, TheLibraryIsReachedByNameAndWantsToBeAcknowledged) {
