@@ -176,6 +176,11 @@ class NoCallstat final : public CallstatBackend {
   }
 };
 
+class NoBluetooth final : public BluetoothDevices {
+ public:
+  Listing pairedDevices() override { return {.devices = {}, .unavailable = "none here"}; }
+};
+
 struct Host {
   NoQueue queue;
   SystemClock clock;
@@ -198,6 +203,7 @@ struct Host {
   NoCaptures captures;
   NoQueues queue_pool;
   NoCallstat callstat;
+  NoBluetooth bluetooth;
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
                     .log = log,
@@ -214,6 +220,7 @@ struct Host {
                     .driver_stats = driver_stats,
                     .queue_pool = queue_pool,
                     .callstat = callstat,
+                    .bluetooth = bluetooth,
                     .flutter_requests = flutter_requests,
                     .tap_to_kite = tap_to_kite,
                     .command_shell = command_shell,

@@ -13,6 +13,7 @@
 #include "daemon/Directories.h"
 #include "daemon/StoreDurabilityGate.h"
 #include "platform/Platform.h"
+#include "platform/linux/bluetooth/LinuxBluetoothDevices.h"
 #include "platform/linux/callstat/LinuxCallstatBackend.h"
 #include "platform/linux/capture/CaptureService.h"
 #include "platform/linux/diagnostic_log/LinuxDiagnosticLog.h"
@@ -82,6 +83,7 @@ class Daemon {
   StorePlumeMetricSubmitter plume_metrics_;
   StoreEnergylogSink energylog_;
   LinuxCallstatBackend callstat_;
+  const std::unique_ptr<BluetoothDevices> bluetooth_;
   // Destroyed before what its queues' tasks use.
   ElasticQueuePool queue_pool_;
   StoreDurabilityGate durability_gate_;

@@ -2,6 +2,7 @@
 
 #include "core/Log.h"
 #include "platform/AnalyticsSink.h"
+#include "platform/BluetoothDevices.h"
 #include "platform/CallstatBackend.h"
 #include "platform/Clock.h"
 #include "platform/CommandShell.h"
@@ -43,6 +44,7 @@ struct Platform {
   DriverStatsFeed& driver_stats;
   SerialQueuePool& queue_pool;
   CallstatBackend& callstat;
+  BluetoothDevices& bluetooth;
   FlutterRequestService& flutter_requests;
   TapToKiteService& tap_to_kite;
   CommandShell& command_shell;

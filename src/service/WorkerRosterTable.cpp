@@ -1,9 +1,9 @@
 #include "service/WorkerRosterTable.h"
 
-#include <string_view>
 #include <utility>
 #include <vector>
 
+#include "accessories/TalReportingSessionAudioRegistrationWorker.h"
 #include "drivers/TalReportingSessionDriverSnapshotWorker.h"
 #include "drivers/TalReportingSessionMemoryLogWorker.h"
 #include "session/DecliningWorkerClass.h"
@@ -26,17 +26,12 @@ namespace tal {
 
 namespace {
 
-using Traits = TalReportingSessionWorkerClass::Traits;
-
-constexpr Traits kNeither{};
-constexpr Traits kConsumer{.is_consumer = true};
-
-std::unique_ptr<TalReportingSessionWorkerClass> declining(std::string_view name, Traits traits) {
-  return std::make_unique<DecliningWorkerClass>(name, traits);
-}
-
 std::unique_ptr<TalReportingSessionWorkerClass> traceWorkerClass(const Platform& platform) {
-  if (!platform.tracing) return declining("TalReportingSessionTraceWorker", kNeither);
+  constexpr TalReportingSessionWorkerClass::Traits kNeitherConsumerNorProducer{};
+  if (!platform.tracing) {
+    return std::make_unique<DecliningWorkerClass>("TalReportingSessionTraceWorker",
+                                                  kNeitherConsumerNorProducer);
+  }
   return std::make_unique<TalReportingSessionTraceWorkerClass>(*platform.tracing);
 }
 
@@ -59,7 +54,7 @@ std::unique_ptr<WorkerRoster> makeWorkerRoster(const Platform& platform,
   classes.push_back(std::make_unique<TalReportingSessionHoundWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionDPWorkerClass>(platform));
   classes.push_back(std::make_unique<TalReportingSessionSummaryJsonFileWorkerClass>());
-  classes.push_back(declining("TalReportingSessionAudioRegistrationWorker", kConsumer));
+  classes.push_back(std::make_unique<TalReportingSessionAudioRegistrationWorkerClass>(platform));
   classes.push_back(std::make_unique<TalReportingSessionRtcWorkerClass>());
   classes.push_back(std::make_unique<TalReportingSessionTapToKiteWorkerClass>());
   return std::make_unique<WorkerRoster>(std::move(classes), platform.log.session);

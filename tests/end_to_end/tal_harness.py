@@ -184,6 +184,26 @@ class DaemonTest(unittest.TestCase):
         self.addCleanup(client.close)
         return client
 
+    def start_process(self, *command, **options):
+        process = subprocess.Popen(command, stdin=subprocess.DEVNULL, **options)
+
+        def end():
+            process.kill()
+            process.communicate()
+
+        self.addCleanup(end)
+        return process
+
+    def start_bus(self, root):
+        """A bus of the test's own, with nobody on it, and nobody whom it would start."""
+        (pathlib.Path(root) / "bus.conf").write_text(
+            f"<busconfig><type>session</type><listen>unix:path={root}/bus</listen><policy context='default'>"
+            "<allow send_destination='*' eavesdrop='true'/><allow eavesdrop='true'/><allow own='*'/></policy>"
+            "</busconfig>")
+        bus = self.start_process("dbus-daemon", f"--config-file={root}/bus.conf", "--nofork", "--print-address=1",
+                                 stdout=subprocess.PIPE, stderr=subprocess.DEVNULL)
+        return bus.stdout.readline().decode().strip()
+
     def wait_for_no_sessions(self):
         """Clients of earlier cases leave asynchronously."""
         probe = self.connect()

@@ -1,7 +1,6 @@
 """What an internal build does for engineers beside its events."""
 
 import json
-import pathlib
 import shutil
 import subprocess
 import unittest
@@ -58,9 +57,9 @@ class InternalBuild(DaemonTest):
     @unittest.skipUnless(shutil.which("dbus-daemon") and shutil.which("busctl"), "no dbus-daemon or no busctl")
     def test_a_draft_is_shown_on_the_desktop(self):
         root = self.make_root(self.addCleanup)
-        address = self.start_session_bus(root)
-        monitor = self.start("busctl", f"--address={address}", "monitor", "--json=short", stdout=subprocess.PIPE,
-                             stderr=subprocess.PIPE)
+        address = self.start_bus(root)
+        monitor = self.start_process("busctl", f"--address={address}", "monitor", "--json=short",
+                                     stdout=subprocess.PIPE, stderr=subprocess.PIPE)
         while b"Monitoring" not in monitor.stderr.readline():
             self.assertIsNone(monitor.poll())
         daemon = self.start_daemon(root=root, config=PROMPTS, environment={"DBUS_SESSION_BUS_ADDRESS": address})
@@ -86,26 +85,6 @@ class InternalBuild(DaemonTest):
         (daemon_block,) = (block for block in blocks if f"wiredlog: RESOURCE talreportingd ({process})" in block)
         self.assertIn(" cpu_time ", daemon_block)
         self.assertTrue(any("MemTotal" in block or "slabinfo" in block for block in blocks))
-
-    def start(self, *command, **options):
-        process = subprocess.Popen(command, stdin=subprocess.DEVNULL, **options)
-
-        def end():
-            process.kill()
-            process.communicate()
-
-        self.addCleanup(end)
-        return process
-
-    def start_session_bus(self, root):
-        """A bus with nobody on it, and nobody whom it would start."""
-        (pathlib.Path(root) / "bus.conf").write_text(
-            f"<busconfig><type>session</type><listen>unix:path={root}/bus</listen><policy context='default'>"
-            "<allow send_destination='*' eavesdrop='true'/><allow eavesdrop='true'/><allow own='*'/></policy>"
-            "</busconfig>")
-        bus = self.start("dbus-daemon", f"--config-file={root}/bus.conf", "--nofork", "--print-address=1",
-                         stdout=subprocess.PIPE, stderr=subprocess.DEVNULL)
-        return bus.stdout.readline().decode().strip()
 
 
 if __name__ == "__main__":

@@ -15,6 +15,7 @@
 
 #include "core/Log.h"
 #include "platform/Platform.h"
+#include "support/FakeBluetoothDevices.h"
 #include "support/FakeCallstatBackend.h"
 #include "support/FakeCommandShell.h"
 #include "support/FakeDriverStatsFeed.h"
@@ -189,6 +190,7 @@ struct TestPlatform {
   FakeCommandShell command_shell;
   HandQueuePool queue_pool{clock};
   FakeCallstatBackend callstat;
+  FakeBluetoothDevices bluetooth;
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
                     .log = channels,
@@ -205,6 +207,7 @@ struct TestPlatform {
                     .driver_stats = driver_stats,
                     .queue_pool = queue_pool,
                     .callstat = callstat,
+                    .bluetooth = bluetooth,
                     .flutter_requests = flutter_requests,
                     .tap_to_kite = tap_to_kite,
                     .command_shell = command_shell};

@@ -50,6 +50,7 @@ TEST(SystemMonitorOnLinux, ANewDeviceNameReachesEveryRunningSessionAtItsNotifica
                           .driver_stats = host.driver_stats,
                           .queue_pool = host.queue_pool,
                           .callstat = host.callstat,
+                          .bluetooth = host.bluetooth,
                           .flutter_requests = host.flutter_requests,
                           .tap_to_kite = host.tap_to_kite,
                           .command_shell = host.command_shell};

@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "core/MessageKeys.h"
+#include "session/CallstatInfo.h"
 #include "workers/sinks/CallstatTraffic.h"
 
 namespace tal {
@@ -17,18 +18,10 @@ namespace tal {
 namespace {
 
 constexpr std::chrono::seconds kLongestWaitForBackends{9};
-constexpr int kClientTypeTalsys = 19;
-constexpr double kClientVersion = TAL_CLIENT_VERSION;
-constexpr std::string_view TalReportingClientNameTalsys = "org.vantle.talsys";
 
 MessageDict sessionInfo(const CallstatTraffic::Opening& opening, const CallstatToken& token) {
   const bool batched = shouldBatchCallstatEventsForServiceType(opening.service_type);
-  MessageDict info{{kCallstatClientType, kClientTypeTalsys},
-                   {kCallstatClientVersion, kClientVersion},
-                   {kCallstatSessionIdentifier, opening.reporter_id},
-                   {kCallstatBatchEvents, batched},
-                   {kCallstatHierarchyToken, token.text},
-                   {kCallstatContainsRealTimeEvents, !batched}};
+  MessageDict info = callstatSessionInfo(opening.reporter_id, token, batched);
   if (const MessageValue* name = opening.configuration.find(TalReportingApplicationName)) {
     info.set(kCallstatClientBundleIdentifier, *name);
   }
@@ -36,9 +29,7 @@ MessageDict sessionInfo(const CallstatTraffic::Opening& opening, const CallstatT
 }
 
 MessageDict userInfo(const CallstatTraffic::Opening& opening, bool internal_build) {
-  MessageDict info{{kCallstatClientName, MessageValue::literal(TalReportingClientNameTalsys)},
-                   {"TalReportingSessionID", opening.reporter_id},
-                   {kCallstatServiceName, opening.service_name}};
+  MessageDict info = callstatUserInfo(opening.reporter_id, opening.service_name);
   if (internal_build) info.set(kCallstatSessionIdentifier, opening.reporter_id);
   info.merge(opening.configuration);
   return info;

@@ -142,6 +142,7 @@ class IpcHost {
   HandClock idle_clock;
   HandQueuePool queue_pool{idle_clock};
   FakeCallstatBackend callstat;
+  FakeBluetoothDevices bluetooth;
   ReportingQueue queue{"test"};
   Platform platform{.reporting_queue = queue,
                     .clock = clock,
@@ -159,6 +160,7 @@ class IpcHost {
                     .driver_stats = driver_stats,
                     .queue_pool = queue_pool,
                     .callstat = callstat,
+                    .bluetooth = bluetooth,
                     .flutter_requests = flutter_requests,
                     .tap_to_kite = tap_to_kite,
                     .command_shell = command_shell};

@@ -14,9 +14,8 @@ namespace {
 
 std::error_code lastError() { return {errno, std::generic_category()}; }
 
-std::error_code writeDurably(int file, std::string_view text) {
-  constexpr mode_t kOwnerAndGroup = 0640;
-  if (::fchmod(file, kOwnerAndGroup) != 0) return lastError();
+std::error_code writeDurably(int file, std::string_view text, mode_t mode) {
+  if (::fchmod(file, mode) != 0) return lastError();
   while (!text.empty()) {
     const ssize_t written = ::write(file, text.data(), text.size());
     if (written >= 0) {
@@ -38,11 +37,11 @@ void syncDirectory(const std::filesystem::path& directory) {
 
 }  // namespace
 
-std::error_code replaceFile(const std::filesystem::path& path, std::string_view text) {
+std::error_code replaceFile(const std::filesystem::path& path, std::string_view text, mode_t mode) {
   std::string temporary = path.string() + ".XXXXXX";
   const int file = ::mkostemp(temporary.data(), O_CLOEXEC);
   if (file < 0) return lastError();
-  std::error_code error = writeDurably(file, text);
+  std::error_code error = writeDurably(file, text, mode);
   if (::close(file) != 0 && !error) error = lastError();
   if (!error && ::rename(temporary.c_str(), path.c_str()) != 0) error = lastError();
   if (error) {
