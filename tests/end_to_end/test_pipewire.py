@@ -65,6 +65,8 @@ class Program:
 class PipeWireTest(DaemonTest):
     """Each case has a daemon, a PipeWire and a reporter of its own."""
 
+    own_config = {}  # files of that daemon's config directory
+
     @classmethod
     def setUpClass(cls):
         cls.sounds = pathlib.Path(tempfile.mkdtemp(prefix="tal-sounds-"))
@@ -75,7 +77,7 @@ class PipeWireTest(DaemonTest):
 
     def setUp(self):
         self.root = pathlib.Path(self.make_root(self.addCleanup))
-        self.daemon = self.start_daemon(root=self.root)
+        self.daemon = self.start_daemon(root=self.root, config=self.own_config)
         self.runtime = self.root / "pipewire"
         self.environment = {**os.environ, "PIPEWIRE_RUNTIME_DIR": str(self.runtime)}
         self.environment.pop("PIPEWIRE_REMOTE", None)
