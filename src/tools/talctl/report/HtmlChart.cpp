@@ -43,8 +43,8 @@ std::string share(double part, double whole) {
 
 std::string part(std::string_view of, std::string_view dimension, double seconds, double whole) {
   if (!(seconds > 0)) return {};
-  return "<i class=\"" + std::string(of) + "\" style=\"" + std::string(dimension) + ':' +
-         share(seconds, whole) + "\"></i>";
+  return R"(<i class=")" + std::string(of) + R"(" style=")" + std::string(dimension) + ':' +
+         share(seconds, whole) + R"("></i>)";
 }
 
 bool isTroubled(const Usage& usage) { return usage.overloads() > 0 || usage.errors > 0; }
@@ -67,18 +67,18 @@ struct Contents {
 std::string figures(const std::string& first_column, const std::vector<ChartColumn>& columns,
                     Contents contents) {
   std::string html = "<details><summary>Figures</summary><table><tr><th>" + first_column +
-                     "</th><th class=\"right\">Played</th>";
-  if (contents.recorded) html += "<th class=\"right\">Recorded</th>";
-  if (contents.trouble) html += "<th class=\"right\">Trouble</th>";
+                     R"(</th><th class="right">Played</th>)";
+  if (contents.recorded) html += R"(<th class="right">Recorded</th>)";
+  if (contents.trouble) html += R"(<th class="right">Trouble</th>)";
   html += "</tr>";
   for (const ChartColumn& column : columns) {
     const Usage& usage = column.usage;
     if (!(usage.seconds() > 0) && !isTroubled(usage)) continue;
-    html += "<tr><td>" + escapeHtml(column.name) + "</td><td class=\"right\">" +
+    html += "<tr><td>" + escapeHtml(column.name) + R"(</td><td class="right">)" +
             durationText(usage.played_seconds) + "</td>";
-    if (contents.recorded) html += "<td class=\"right\">" + durationText(usage.recorded_seconds) + "</td>";
+    if (contents.recorded) html += R"(<td class="right">)" + durationText(usage.recorded_seconds) + "</td>";
     if (contents.trouble) {
-      html += "<td class=\"right\">" +
+      html += R"(<td class="right">)" +
               (isTroubled(usage) ? numberText(usage.overloads() + usage.errors) : std::string("–")) + "</td>";
     }
     html += "</tr>\n";
@@ -88,9 +88,9 @@ std::string figures(const std::string& first_column, const std::vector<ChartColu
 
 std::string legend(Contents contents) {
   if (!contents.recorded && !contents.trouble) return {};
-  std::string html = "<figcaption class=\"legend\"><span>played</span>";
-  if (contents.recorded) html += "<span class=\"is-rec\">recorded</span>";
-  if (contents.trouble) html += "<span class=\"is-bad\">overloads or errors</span>";
+  std::string html = R"(<figcaption class="legend"><span>played</span>)";
+  if (contents.recorded) html += R"(<span class="is-rec">recorded</span>)";
+  if (contents.trouble) html += R"(<span class="is-bad">overloads or errors</span>)";
   return html + "</figcaption>";
 }
 
@@ -106,26 +106,27 @@ std::string columnChart(const std::string& what, const std::string& first_column
     contents.trouble |= isTroubled(column.usage);
   }
   const double end = scaleEnd(longest);
-  std::string html = "<figure><div class=\"plot\" role=\"img\" aria-label=\"" + escapeHtml(what) + "\">";
-  html += "<div class=\"line\" style=\"bottom:100%\"><span>" + scaleText(end) + "</span></div>";
-  html += "<div class=\"line\" style=\"bottom:50%\"><span>" + scaleText(end / 2) + "</span></div>";
-  html += "<div class=\"columns\">\n";
+  std::string html = R"(<figure><div class="plot" role="img" aria-label=")" + escapeHtml(what) + R"(">)";
+  html += R"(<div class="line" style="bottom:100%"><span>)" + scaleText(end) + "</span></div>";
+  html += R"(<div class="line" style="bottom:50%"><span>)" + scaleText(end / 2) + "</span></div>";
+  html += R"(<div class="columns">)";
   std::string axis;
   for (const ChartColumn& column : columns) {
     html +=
-        isTroubled(column.usage) ? "<div class=\"column marked\" title=\"" : "<div class=\"column\" title=\"";
-    html += escapeHtml(inWords(column)) + "\">" + part("rec", "height", column.usage.recorded_seconds, end) +
+        isTroubled(column.usage) ? R"(<div class="column marked" title=")" : R"(<div class="column" title=")";
+    html += escapeHtml(inWords(column)) + R"(">)" +
+            part("rec", "height", column.usage.recorded_seconds, end) +
             part("play", "height", column.usage.played_seconds, end) + "</div>\n";
     axis += column.label.empty() ? "<span></span>" : "<span><b>" + escapeHtml(column.label) + "</b></span>";
   }
-  html += "</div></div><div class=\"axis\" aria-hidden=\"true\">" + axis + "</div>";
+  html += R"(</div></div><div class="axis" aria-hidden="true">)" + axis + "</div>";
   html += legend(contents);
   html += "</figure>" + figures(first_column, columns, contents);
   return html;
 }
 
 std::string bar(const Usage& usage, double longest) {
-  return "<div class=\"bar\" aria-hidden=\"true\">" + part("play", "width", usage.played_seconds, longest) +
+  return R"(<div class="bar" aria-hidden="true">)" + part("play", "width", usage.played_seconds, longest) +
          part("rec", "width", usage.recorded_seconds, longest) + "</div>";
 }
 

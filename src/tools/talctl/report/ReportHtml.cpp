@@ -20,7 +20,7 @@ std::string section(std::string_view title, const std::string& content) {
 }
 
 std::string tile(std::string_view name, const std::string& value, std::string_view colour = {}) {
-  return "<div><dt>" + std::string(name) + "</dt><dd class=\"" + std::string(colour) + "\">" + value +
+  return "<div><dt>" + std::string(name) + R"(</dt><dd class=")" + std::string(colour) + R"(">)" + value +
          "</dd></div>\n";
 }
 
@@ -30,7 +30,7 @@ std::string troubleTile(std::string_view name, std::uint64_t count) {
 
 std::string tiles(const AudioReport& report) {
   const std::size_t applications = report.applications.rows.size() + report.applications.other_count;
-  std::string html = "<dl class=\"tiles\">\n" + tile("Played", durationText(report.total.played_seconds)) +
+  std::string html = R"(<dl class="tiles">)" + tile("Played", durationText(report.total.played_seconds)) +
                      tile("Recorded", durationText(report.total.recorded_seconds));
   if (report.total.played_seconds > 0) html += tile("Mean volume", percentText(report.total.meanVolume()));
   html += tile("Applications", numberText(applications));
@@ -40,12 +40,12 @@ std::string tiles(const AudioReport& report) {
 }
 
 std::string coloured(std::string_view colour, const std::string& text) {
-  return "<span class=\"" + std::string(colour) + "\">" + text + "</span>";
+  return R"(<span class=")" + std::string(colour) + R"(">)" + text + "</span>";
 }
 
 /// Facts beside one another; a line breaks between them only.
 std::string facts(const std::vector<std::string>& all) {
-  std::string html = "<div class=\"detail\">";
+  std::string html = R"(<div class="detail">)";
   for (const std::string& fact : all) {
     html += (&fact == &all.front() ? "<span>" : " · <span>") + fact + "</span>";
   }
@@ -71,8 +71,8 @@ std::string detail(const std::string& service, const Usage& usage) {
 
 std::string listItem(std::string_view kind, std::string_view name, const std::string& value,
                      const std::string& below) {
-  return "<li class=\"" + std::string(kind) + "\"><div class=\"head\"><span class=\"name\">" +
-         escapeHtml(name) + "</span><span class=\"value\">" + value + "</span></div>" + below + "</li>\n";
+  return R"(<li class=")" + std::string(kind) + R"("><div class="head"><span class="name">)" +
+         escapeHtml(name) + R"(</span><span class="value">)" + value + "</span></div>" + below + "</li>\n";
 }
 
 using SplitName = std::function<ApplicationName(const std::string&)>;
@@ -84,7 +84,7 @@ std::string rankedList(const Ranking& ranking, const SplitName& split) {
     return listItem(kind, name.application, durationText(usage.seconds()),
                     bar(usage, longest) + detail(name.service, usage));
   };
-  std::string html = "<ol class=\"ranks\">\n";
+  std::string html = R"(<ol class="ranks">)";
   for (const auto& row : ranking.rows) html += item("", split(row.name), row.usage);
   if (ranking.other_count > 0) {
     html += item("others", {countText(ranking.other_count, "other", "others"), ""}, ranking.others);
@@ -106,7 +106,7 @@ std::string volumes(const AudioReport& report) {
                        .label = i % kColumnsPerLabel == 0 ? volume : "",
                        .usage = {.played_seconds = report.volumes[i]}});
   }
-  return "<p class=\"soft\">Playing time at each volume</p>" +
+  return R"(<p class="soft">Playing time at each volume</p>)" +
          columnChart("Playing time at each volume", "Volume", columns);
 }
 
@@ -125,7 +125,7 @@ std::string days(const AudioReport& report) {
   }
   std::string html = columnChart("Playing and recording by day", "Day", columns);
   if (report.earlier.seconds() > 0) {
-    html += "<p class=\"detail\">On earlier days: " + durationText(report.earlier.seconds()) + "</p>";
+    html += R"(<p class="detail">On earlier days: )" + durationText(report.earlier.seconds()) + "</p>";
   }
   return html;
 }
@@ -156,7 +156,7 @@ std::string trouble(const AudioReport& report) {
             " lost while the store could not be written</p>";
   }
   if (report.errors.empty()) return html;
-  html += "<ol class=\"ranks\">\n";
+  html += R"(<ol class="ranks">)";
   for (const auto& [kind, error] : report.errors) {
     std::vector<std::string> all{escapeHtml(kind.event), "last " + timeText(error.last_at)};
     if (!kind.application.empty()) all.insert(all.begin(), escapeHtml(kind.application));
@@ -202,9 +202,9 @@ std::string reportHtml(const AudioReport& report) {
   // run.
   std::string html =
       "<!doctype html>\n<html lang=\"en\">\n<head>\n<meta charset=\"utf-8\">\n"
-      "<meta http-equiv=\"Content-Security-Policy\" content=\"default-src 'none'; style-src 'unsafe-inline'; "
-      "base-uri 'none'; form-action 'none'\">\n"
-      "<meta name=\"viewport\" content=\"width=device-width, initial-scale=1\">\n"
+      R"(<meta http-equiv="Content-Security-Policy" content="default-src 'none'; style-src 'unsafe-inline'; )"
+      R"(base-uri 'none'; form-action 'none'">)"
+      R"(<meta name="viewport" content="width=device-width, initial-scale=1">)"
       "<title>Audio report</title>\n<style>";
   html += kReportStyle;
   html += "</style>\n</head>\n<body>\n<header><h1>Audio report</h1>\n<p>" + escapeHtml(periodText(report)) +

@@ -33,7 +33,9 @@ struct ErrorKind {
   std::string event;  ///< Category and type: "Error.IssueDetector".
   std::string issue;  ///< "" where the event does not tell.
   std::string application;
-  auto operator<=>(const ErrorKind&) const = default;
+  bool operator<(const ErrorKind& other) const {
+    return std::tie(event, issue, application) < std::tie(other.event, other.issue, other.application);
+  }
 };
 struct ErrorCount {
   std::uint64_t count = 0;
