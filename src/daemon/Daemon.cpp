@@ -175,6 +175,7 @@ TalReportingService::Options Daemon::serviceOptions() {
 // On the I/O thread, while others run on: no destructor may run.
 void Daemon::endProcess() {
   queue_pool_.stop();
+  callstat_.stop();
   store_.flushAndClose();
   ::_exit(kExitKilled);
 }
@@ -199,6 +200,7 @@ void Daemon::endInOrder() {
   // Captures that were asked for are still written; timed ones are not waited for.
   if (capture_queue_) capture_queue_->stop();
   queue_pool_.stop();
+  callstat_.stop();
   store_.flushAndClose();
   listener_.stop();
   queue_.stop();

@@ -29,11 +29,18 @@ std::int64_t lastSessionIn(const std::filesystem::path& store_path) {
 LinuxCallstatBackend::LinuxCallstatBackend(Dependencies dependencies)
     : dependencies_(std::move(dependencies)),
       settings_reader_(dependencies_.settings, dependencies_.log),
+      publishers_(makeOutboxPublishers({.store = dependencies_.store,
+                                        .store_path = dependencies_.store_path,
+                                        .settings = settings_reader_,
+                                        .clock = dependencies_.clock,
+                                        .log = dependencies_.log})),
       last_session_(lastSessionIn(dependencies_.store_path)) {
   // Sessions of a daemon that did not end in order are over too.
   if (last_session_ > 0) {
     dependencies_.store.append({.table = StoreTable::kRtcSessionEnds, .number = 0, .detail = last_session_});
   }
+  // What an earlier daemon could not send.
+  publishers_->serve(settings_reader_.read().brokers);
 }
 
 std::optional<CallstatToken> LinuxCallstatBackend::newHierarchyTokenFromParentToken(
@@ -58,6 +65,7 @@ std::unique_ptr<CallstatSession> LinuxCallstatBackend::initWithSessionInfo(Messa
   return std::make_unique<LinuxCallstatSession>(
       LinuxCallstatSession::Dependencies{.store = dependencies_.store,
                                          .settings = settings_reader_,
+                                         .publishers = *publishers_,
                                          .clock = dependencies_.clock,
                                          .log = dependencies_.log},
       ++last_session_, std::move(session_info), std::move(user_info));

@@ -13,6 +13,7 @@
 #include "platform/Clock.h"
 #include "platform/SettingsStore.h"
 #include "platform/linux/callstat/CallstatSettings.h"
+#include "platform/linux/callstat/OutboxPublishers.h"
 #include "platform/linux/store/StoreWriter.h"
 
 namespace tal {
@@ -20,7 +21,9 @@ namespace tal {
 /// Real-time messages on Linux. Back-ends found are the store, where the setting
 /// `store` of "org.vantle.talsys.rtc" is true: then messages stand in the view
 /// `rtc_messages`. They are known at once, so a session is answered before
-/// `startConfigurationWithCompletionHandler` returns.
+/// `startConfigurationWithCompletionHandler` returns. So is one outbox for each of
+/// `brokers`, whatever the state of the connection: a broker that is away loses
+/// nothing.
 ///
 /// A message is durable once its row is committed.
 class LinuxCallstatBackend final : public CallstatBackend {
@@ -41,9 +44,13 @@ class LinuxCallstatBackend final : public CallstatBackend {
       MessageDict session_info, MessageDict user_info,
       const std::vector<std::string>& frameworks_to_check) override;
 
+  /// Sends nothing more; before the store is closed.
+  void stop() { publishers_->stop(); }
+
  private:
   Dependencies dependencies_;
   CallstatSettingsReader settings_reader_;
+  std::unique_ptr<OutboxPublishers> publishers_;
   std::atomic<std::int64_t> last_session_;  // row of rtc_sessions
 };
 

@@ -21,7 +21,10 @@ LinuxCallstatSession::LinuxCallstatSession(Dependencies dependencies, std::int64
     : dependencies_(dependencies),
       row_(row),
       session_info_(std::move(session_info)),
-      user_info_(std::move(user_info)) {}
+      user_info_(std::move(user_info)) {
+  const MessageValue* const realtime = session_info_.find(kCallstatContainsRealTimeEvents);
+  is_realtime_ = realtime && realtime->toBool();
+}
 
 LinuxCallstatSession::~LinuxCallstatSession() {
   if (announced_) {
@@ -34,6 +37,9 @@ void LinuxCallstatSession::startConfigurationWithCompletionHandler(CompletionHan
   to_store_ = settings.store;
   std::vector<std::string> backends;
   if (to_store_) backends.emplace_back(kStoreBackendName);
+  const std::vector<std::string> brokers = dependencies_.publishers.serve(settings.brokers);
+  to_brokers_ = !brokers.empty();
+  backends.insert(backends.end(), brokers.begin(), brokers.end());
   handler(backends);
 }
 
@@ -43,6 +49,12 @@ CallstatSession::Error LinuxCallstatSession::sendMessage(std::uint16_t category,
   payload_.clear();
   appendPayload(payload);
   if (to_store_) append(StoreTable::kRtcMessages, category, type);
+  if (to_brokers_) {
+    append(StoreTable::kRtcOutbox, category, type);
+    // A real-time message is not to wait for others to be committed with.
+    if (is_realtime_) dependencies_.store.requestCommit(dependencies_.store.sequence());
+    dependencies_.publishers.messageWaits();
+  }
   if (payload_.capacity() > kMostPayloadKept) std::string().swap(payload_);
   return std::nullopt;
 }
@@ -84,8 +96,9 @@ void LinuxCallstatSession::append(StoreTable table, std::uint16_t category, std:
                               .payload = payload_});
 }
 
-// Rows leave by themselves.
-void LinuxCallstatSession::flushMessages() {}
+void LinuxCallstatSession::flushMessages() {
+  if (to_brokers_) dependencies_.publishers.flush(row_);
+}
 
 std::string LinuxCallstatSession::description() const {
   const MessageValue* identifier = session_info_.find(kCallstatSessionIdentifier);

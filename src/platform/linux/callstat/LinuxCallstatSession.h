@@ -7,6 +7,7 @@
 #include "platform/CallstatBackend.h"
 #include "platform/Clock.h"
 #include "platform/linux/callstat/CallstatSettings.h"
+#include "platform/linux/callstat/OutboxPublishers.h"
 #include "platform/linux/store/StoreWriter.h"
 
 namespace tal {
@@ -18,6 +19,7 @@ class LinuxCallstatSession final : public CallstatSession {
   struct Dependencies {
     StoreWriter& store;
     CallstatSettingsReader& settings;
+    OutboxPublishers& publishers;
     const Clock& clock;
     const LogChannel& log;
   };
@@ -43,8 +45,10 @@ class LinuxCallstatSession final : public CallstatSession {
   std::int64_t row_;
   MessageDict session_info_;
   MessageDict user_info_;
+  bool is_realtime_ = false;
   bool announced_ = false;
   bool to_store_ = false;
+  bool to_brokers_ = false;
   std::string payload_;  // kept for its memory
 };
 
