@@ -88,7 +88,7 @@ Daemon::Daemon(const DaemonOptions& options, const std::string& version)
       diagnostic_log_(directories_.log),
       driver_stats_(
           {.config_directory = directories_.config, .log = log_.driver_utility, .root = options.host_root}),
-      flutter_requests_(log_.flutter),
+      no_flutter_requests_(log_.flutter),
       tap_to_kite_({.diagnostic_log = diagnostic_log_,
                     .clock = clock_,
                     .log = log_.session,
@@ -121,7 +121,7 @@ Daemon::Daemon(const DaemonOptions& options, const std::string& version)
                 .queue_pool = queue_pool_,
                 .callstat = callstat_,
                 .bluetooth = *bluetooth_,
-                .flutter_requests = flutter_requests_,
+                .flutter_requests = flutterRequests(),
                 .tap_to_kite = tap_to_kite_,
                 .command_shell = command_shell_,
                 .symptom_reporters = captures_.get(),
@@ -135,6 +135,11 @@ Daemon::Daemon(const DaemonOptions& options, const std::string& version)
   // A client or a log reader that goes away is an error of one write, no more.
   std::signal(SIGPIPE, SIG_IGN);
   raiseDescriptorLimit(readIpcSettings(settings_).max_connections);
+}
+
+FlutterRequestService& Daemon::flutterRequests() {
+  if (captures_) return *captures_;
+  return no_flutter_requests_;
 }
 
 std::unique_ptr<CaptureService> Daemon::makeCaptureService() {

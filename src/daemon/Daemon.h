@@ -58,6 +58,7 @@ class Daemon {
   void run();
 
  private:
+  FlutterRequestService& flutterRequests();
   std::unique_ptr<CaptureService> makeCaptureService();
   std::vector<std::int32_t> clientProcesses() const;
   ListeningSocket listeningSocket() const;
@@ -91,7 +92,7 @@ class Daemon {
   LinuxSystemState system_state_;
   LinuxDiagnosticLog diagnostic_log_;
   LinuxDriverStatsFeed driver_stats_;
-  UnavailableFlutterRequestService flutter_requests_;
+  UnavailableFlutterRequestService no_flutter_requests_;  // on a customer build
   LinuxTapToKiteService tap_to_kite_;
   LinuxCommandShell command_shell_;
   LinuxTracing tracing_;

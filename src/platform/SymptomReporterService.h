@@ -1,5 +1,6 @@
 #pragma once
 
+#include <array>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -38,6 +39,18 @@ enum HoundDiagError : std::int32_t {
   kHoundDiagErrorSessionNotFound = 8,
   kHoundDiagErrorRequestThrottled = 9,
 };
+
+/// By HoundDiagError.
+inline constexpr std::array<std::string_view, 10> kHoundDiagErrorNames{"kHoundDiagErrorNone",
+                                                                       "kHoundDiagErrorServiceNotReady",
+                                                                       "kHoundDiagErrorNotSupported",
+                                                                       "kHoundDiagErrorServiceUnavailable",
+                                                                       "kHoundDiagErrorServiceInterrupted",
+                                                                       "kHoundDiagErrorInvalidParameters",
+                                                                       "kHoundDiagErrorDailyLimitExceeded",
+                                                                       "kHoundDiagErrorRandomizedSuppression",
+                                                                       "kHoundDiagErrorSessionNotFound",
+                                                                       "kHoundDiagErrorRequestThrottled"};
 
 /// Takes captures of the whole device for engineers when a fault was seen.
 ///

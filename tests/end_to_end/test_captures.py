@@ -10,9 +10,10 @@ import unittest
 from unittest import mock
 
 import talreporting
-from tal_harness import DaemonTest, PLAYBACK
+from tal_harness import DaemonTest, PLAYBACK, run_program
 
 ERROR, ENERGYLOG, ISSUE_DETECTOR = 11, 8, 7
+IO, ERROR_TYPE = 7, 6
 INTERNAL = {"device.toml": "InternalBuild = true\nHapticLeakCaptureOptIn = true\n"}
 
 # A client of its own process: does what it is told, then stays until its input ends.
@@ -97,6 +98,39 @@ class Captures(DaemonTest):
         for path, mode in ((self.captures, 0o750), (capture, 0o750), (capture / "log.txt", 0o640)):
             self.assertEqual(path.stat().st_mode & 0o7777, mode, path)
         daemon.eventually(lambda: f"sessionId={name} response" in daemon.log(), "the request is answered")
+
+    def test_an_overload_is_captured_and_talctl_prints_it(self):
+        daemon = self.start({**INTERNAL, "settings/org.vantle.talsys.talreporting.toml": "enable_flutter = true\n"})
+        listed = run_program("talctl", "--root", str(self.root), "captures", "--json")
+        self.assertEqual((listed.returncode, listed.stdout), (0, ""), "none as yet is no failure")
+        self.session(daemon, 7, "generic").send_message(
+            {"smallest_buffer_frame_size": 512, "text": "\x1b[2J\u202e"}, IO, ERROR_TYPE, [7])
+        daemon.eventually(self.whole, "there is a capture")
+        (name,) = self.whole()
+        os.symlink("/etc/passwd", self.captures / name / "link.txt")
+        os.symlink("/etc", self.captures / "20260101T000000Z-link")
+
+        listed = run_program("talctl", "--root", str(self.root), "captures", "--json")
+        (told,) = [json.loads(line) for line in listed.stdout.splitlines()]
+        self.assertEqual((told["identifier"], told["kind"]), (name, "AudioOverloads"))
+        self.assertEqual(told["bytes"], sum(file.lstat().st_size for file in (self.captures / name).iterdir()
+                                            if not file.is_symlink()))
+        table = run_program("talctl", "--root", str(self.root), "captures").stdout.splitlines()
+        self.assertEqual(table[1].split()[:3], [name, "AudioOverloads", "AudioOverloads"])
+
+        shown = run_program("talctl", "--root", str(self.root), "captures", "show", name)
+        headings = [line[5:] for line in shown.stdout.splitlines() if line.startswith("==== ")]
+        self.assertEqual([heading for heading in headings if heading != "trace.txt"],
+                         ["signature.json", "payload.json", "processes.txt", "scheduler.txt", "system.txt", "log.txt"])
+        self.assertIn("== /proc/stat", shown.stdout)
+        for forbidden in ("\x1b", "\u202e", "root:"):
+            self.assertNotIn(forbidden, shown.stdout)
+        payload = run_program("talctl", "--root", str(self.root), "captures", "show", name, "--file", "payload.json")
+        self.assertEqual(json.loads(payload.stdout)["text"], "\x1b[2J\u202e")
+        for arguments in (["20260101T000000Z-link"], [".."], ["../.."], ["nothing"], [name, "--file", "link.txt"],
+                          [name, "--file", "../x"]):
+            refused = run_program("talctl", "--root", str(self.root), "captures", "show", *arguments)
+            self.assertEqual((refused.returncode, refused.stdout), (1, ""), arguments)
 
     def test_a_customer_build_captures_nothing(self):
         daemon = self.start(config={"device.toml": "HapticLeakCaptureOptIn = true\n"})

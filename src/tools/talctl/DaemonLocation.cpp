@@ -39,20 +39,21 @@ std::optional<fs::path> userDirectory(const char* name, const char* fallback) {
 }
 
 DaemonLocation underRoot(const fs::path& root) {
-  return {root / "run" / kSocketName, root / "state", root / "config"};
+  return {root / "run" / kSocketName, root / "state", root / "config", root / "log"};
 }
 
 DaemonLocation systemDaemon() {
   return {fs::path("/run") / kProgramName / kSocketName, fs::path("/var/lib") / kProgramName,
-          fs::path("/etc") / kProgramName};
+          fs::path("/etc") / kProgramName, fs::path("/var/log") / kProgramName};
 }
 
 std::optional<DaemonLocation> userDaemon() {
   const auto runtime = environmentPath("XDG_RUNTIME_DIR");
   if (!runtime) return std::nullopt;
-  return DaemonLocation{*runtime / kProgramName / kSocketName,
-                        userDirectory("XDG_STATE_HOME", ".local/state"),
-                        userDirectory("XDG_CONFIG_HOME", ".config")};
+  const auto state = userDirectory("XDG_STATE_HOME", ".local/state");
+  return DaemonLocation{*runtime / kProgramName / kSocketName, state,
+                        userDirectory("XDG_CONFIG_HOME", ".config"),
+                        state ? std::optional(*state / "log") : std::nullopt};
 }
 
 /// Whether somebody listens there. One whose queue is full does, too.
@@ -87,7 +88,7 @@ DaemonLocation atSocket(const fs::path& socket) {
   if (socket.filename() == kSocketName && directory.filename() == "run" && directory != "/run") {
     return underRoot(directory.parent_path());
   }
-  return {socket, std::nullopt, std::nullopt};
+  return {socket, std::nullopt, std::nullopt, std::nullopt};
 }
 
 fs::path require(const std::optional<fs::path>& directory) {
@@ -98,6 +99,8 @@ fs::path require(const std::optional<fs::path>& directory) {
 }  // namespace
 
 fs::path DaemonLocation::storePath() const { return require(state_directory) / "store.db"; }
+
+fs::path DaemonLocation::capturesPath() const { return require(log_directory) / "Audio/Captures"; }
 
 fs::path DaemonLocation::notifyDirectory() const {
   require(state_directory);  // else the socket need not stand in the daemon's own runtime directory

@@ -14,8 +14,10 @@ struct DaemonLocation {
   /// Absent where only the socket is known, and it is at none of the usual places.
   std::optional<std::filesystem::path> state_directory;
   std::optional<std::filesystem::path> config_directory;
+  std::optional<std::filesystem::path> log_directory;
 
   std::filesystem::path storePath() const;
+  std::filesystem::path capturesPath() const;
   /// Where notifications are posted, whether it is there already or not.
   std::filesystem::path notifyDirectory() const;
   /// The two layers of a settings domain.

@@ -10,6 +10,7 @@
 #include <string>
 #include <vector>
 
+#include "tools/talctl/CapturesCommand.h"
 #include "tools/talctl/CommandFailure.h"
 #include "tools/talctl/DaemonCommands.h"
 #include "tools/talctl/DaemonLocation.h"
@@ -36,6 +37,8 @@ struct CommandLine {
   EventsOptions events;
   ReportOptions report;
   std::string script;
+  std::string capture;
+  std::string file;
   std::vector<std::string> files;
   std::string notification;
   std::string state;
@@ -119,6 +122,20 @@ void addNotify(CLI::App& app, CommandLine& line) {
   });
 }
 
+void addCaptures(CLI::App& app, CommandLine& line) {
+  CLI::App* command = app.add_subcommand("captures", "List what was captured when a fault was seen");
+  addJson(*command, line);
+  CLI::App* show = command->add_subcommand("show", "Print one");
+  show->add_option("ID", line.capture, "Its name in the list")->required();
+  show->add_option("--file", line.file, "Only this file of it, as it is");
+  command->callback([&line, show] {
+    line.run = [&line, shows = show->parsed()](const auto& daemon, const auto& terminal) {
+      if (shows) return runCapturesShow(daemon, line.capture, line.file, terminal);
+      runCaptures(daemon, line.json, terminal);
+    };
+  });
+}
+
 void addSettings(CLI::App& app, CommandLine& line) {
   CLI::App* command = app.add_subcommand("settings", "Read and write settings");
   command->require_subcommand(1);
@@ -176,6 +193,7 @@ int run(int argc, char** argv) {
   addEvents(app, line);
   addReport(app, line);
   addNotify(app, line);
+  addCaptures(app, line);
   addSettings(app, line);
   addPerf(app, line);
   addKill(app, line);

@@ -1,7 +1,6 @@
 #include "workers/diagnostics/TalReportingSessionHoundWorker.h"
 
 #include <algorithm>
-#include <array>
 #include <chrono>
 #include <utility>
 
@@ -16,22 +15,10 @@ namespace {
 constexpr std::size_t kMostContextMessages = 200;
 constexpr std::size_t kMostContextBytes = std::size_t{1} << 20;
 
-// By HoundDiagError.
-constexpr std::array<std::string_view, 10> kReasonNames{"kHoundDiagErrorNone",
-                                                        "kHoundDiagErrorServiceNotReady",
-                                                        "kHoundDiagErrorNotSupported",
-                                                        "kHoundDiagErrorServiceUnavailable",
-                                                        "kHoundDiagErrorServiceInterrupted",
-                                                        "kHoundDiagErrorInvalidParameters",
-                                                        "kHoundDiagErrorDailyLimitExceeded",
-                                                        "kHoundDiagErrorRandomizedSuppression",
-                                                        "kHoundDiagErrorSessionNotFound",
-                                                        "kHoundDiagErrorRequestThrottled"};
-
 void logRefusal(std::int64_t reason, const LogChannel& log) {
-  const bool named = reason >= 0 && static_cast<std::size_t>(reason) < kReasonNames.size();
+  const bool named = reason >= 0 && static_cast<std::size_t>(reason) < kHoundDiagErrorNames.size();
   const std::string name =
-      named ? std::string(kReasonNames[static_cast<std::size_t>(reason)]) : std::to_string(reason);
+      named ? std::string(kHoundDiagErrorNames[static_cast<std::size_t>(reason)]) : std::to_string(reason);
   const LogLevel level = reason == kHoundDiagErrorNone ? LogLevel::kError : LogLevel::kInfo;
   TAL_LOG_AT(log, level, "Failed starting hound session. reason=", name);
 }

@@ -183,6 +183,28 @@ TEST_F(CaptureServiceTest, RefusalsHaveTheirReasons) {
   EXPECT_TRUE(host.log.holds("could not be written and is left out"));
 }
 
+TEST_F(CaptureServiceTest, OverloadIsCapturedWithTheScheduler) {
+  const FlutterRequest overload{
+      .domain = "org.vantle.talsys",
+      .type = "AudioOverloads",
+      .description = "a/player",
+      .payload = {{"io_cycle", 9},
+                  {kHoundDiagKeyPayloadPKParameters,
+                   MessageDict{{kPKSysLogFilterProcess, MessageDict{{kProcessIDs, MessageArray{1}}}}}}},
+      .flags = {true, true, false, false, false}};
+  service->requestFlutter(overload);
+  service->requestFlutter(overload);
+  settle();
+  EXPECT_THAT(captures(), ElementsAre("20270115T080000Z-AudioOverloads-a_player"));
+  EXPECT_TRUE(host.log.holds("no capture of kind AudioOverloads. reason=kHoundDiagErrorRequestThrottled"));
+  EXPECT_THAT(file("signature.json"), HasSubstr(R"("kind":"AudioOverloads")"));
+  EXPECT_THAT(file("signature.json"), HasSubstr(R"("flags":[true,true,false,false,false])"));
+  EXPECT_THAT(file("payload.json"), HasSubstr(R"("io_cycle":9)"));
+  EXPECT_THAT(file("scheduler.txt"), HasSubstr("== /proc/stat\n"));
+  EXPECT_THAT(file("processes.txt"), HasSubstr("process " + std::to_string(::getpid())))
+      << "a client does not choose what is looked at";
+}
+
 TEST_F(CaptureServiceTest, CapturesOfOneSecondHaveNamesOfTheirOwn) {
   ask({.type = "x", .process = "p"});
   ask({.type = "x", .process = "Unknown"});

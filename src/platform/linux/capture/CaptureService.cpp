@@ -104,7 +104,8 @@ bool CaptureService::snapshot(Request request, std::shared_ptr<const SymptomCont
     return true;
   }
   MessageDict success{{kHoundDiagReplySuccess, true}, {kHoundDiagReplySessionID, order.identifier}};
-  write(std::move(order), [this, reply = std::move(request.reply), success](std::error_code error) {
+  const auto payload = order.payload;
+  write(std::move(order), payload, [this, reply = std::move(request.reply), success](std::error_code error) {
     if (error) return refuse(reply, kHoundDiagErrorServiceUnavailable);
     answer(reply, success);
   });
@@ -159,16 +160,26 @@ void CaptureService::timeIsOver(const std::string& identifier) {
   CaptureOrder order = std::move(found->second);
   open_.erase(found);
   // The writer logs how it went; nobody else asks any more.
-  write(std::move(order), [](std::error_code) {});
+  const auto payload = order.payload;
+  write(std::move(order), payload, [](std::error_code) {});
 }
 
-void CaptureService::captureUnanswered(CaptureOrder order) {
+void CaptureService::requestFlutter(FlutterRequest request) {
   assertOnQueue(dependencies_.reporting_queue);
+  CaptureOrder order{.kind = request.type,
+                     .signature = {{kDomain, request.domain},
+                                   {kType, request.type},
+                                   {kDetectedProcess, request.description},
+                                   {"flags", MessageArray(request.flags.begin(), request.flags.end())}},
+                     .payload = std::move(request.payload),
+                     .with_scheduler = true};
   if (const auto reason = admit(order)) {
-    TAL_LOG_INFO(dependencies_.log, "no capture of kind ", order.kind, ". reason=", std::int32_t{*reason});
+    TAL_LOG_INFO(dependencies_.log, "no capture of kind ", order.kind,
+                 ". reason=", kHoundDiagErrorNames[static_cast<std::size_t>(*reason)]);
     return;
   }
-  write(std::move(order), [](std::error_code) {});
+  // The payload is a client's message: which processes to look at is not its choice.
+  write(std::move(order), std::nullopt, [](std::error_code) {});
 }
 
 std::optional<HoundDiagError> CaptureService::admit(CaptureOrder& order) {
@@ -200,9 +211,10 @@ std::string CaptureService::makeIdentifier(const MessageDict& signature, double 
   return unique;
 }
 
-void CaptureService::write(CaptureOrder order, Written written) {
+void CaptureService::write(CaptureOrder order, const std::optional<MessageDict>& names_processes,
+                           Written written) {
   ++being_written_;
-  order.process_identifiers = processesToLookAt(order.payload);
+  order.process_identifiers = processesToLookAt(names_processes);
   // The outcome comes back to the queue that the request came from, and only if the
   // service is still there; until then the work refers to the writer alone.
   const auto outcome = std::make_shared<std::error_code>();

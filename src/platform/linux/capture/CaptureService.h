@@ -16,6 +16,7 @@
 
 #include "core/Log.h"
 #include "platform/Clock.h"
+#include "platform/FlutterRequestService.h"
 #include "platform/LifeToken.h"
 #include "platform/ProcessTable.h"
 #include "platform/SerialQueue.h"
@@ -40,7 +41,7 @@ namespace tal {
 /// | ServiceNotReady | too many are open or being written |
 /// | ServiceUnavailable | it could not be written: the disk is full, for one |
 /// | SessionNotFound | (in the log only) nothing open has that identifier |
-class CaptureService final : public SymptomReporterFactory {
+class CaptureService final : public SymptomReporterFactory, public FlutterRequestService {
  public:
   struct Dependencies {
     SerialQueue& reporting_queue;
@@ -60,8 +61,9 @@ class CaptureService final : public SymptomReporterFactory {
 
   std::shared_ptr<SymptomReporterService> makeClient(SymptomContext context) override;
 
-  /// A capture of the kind that nobody waits for, under the same limits.
-  void captureUnanswered(CaptureOrder order);
+  /// A capture with the scheduler's state and the kernel's trace buffer beside the
+  /// rest, under the same limits; a refusal stands in the log.
+  void requestFlutter(FlutterRequest request) override;
 
  private:
   class Client;
@@ -76,7 +78,7 @@ class CaptureService final : public SymptomReporterFactory {
   /// Counts the capture and names it, or tells why not.
   std::optional<HoundDiagError> admit(CaptureOrder& order);
   std::string makeIdentifier(const MessageDict& signature, double now);
-  void write(CaptureOrder order, Written written);
+  void write(CaptureOrder order, const std::optional<MessageDict>& names_processes, Written written);
   void timeIsOver(const std::string& identifier);
   std::vector<std::int32_t> processesToLookAt(const std::optional<MessageDict>& payload) const;
   void keepThrottle();

@@ -49,11 +49,11 @@ std::error_code CaptureWriter::write(const CaptureOrder& order) const {
   std::error_code error;
   if (const auto draft = archive_.begin(order.identifier, error)) {
     // First what changes fastest.
-    draft->write("processes.txt", processReport(order.process_identifiers));
     if (order.with_scheduler) {
       draft->write("scheduler.txt", schedulerReport());
       if (const std::string trace = traceBuffer(); !trace.empty()) draft->write("trace.txt", trace);
     }
+    draft->write("processes.txt", processReport(order.process_identifiers));
     draft->write("log.txt", dependencies_.log_ring.text());
     draft->write("system.txt", systemReport());
     if (order.context) draft->write("messages.jsonl", messagesFile(*order.context));
