@@ -36,7 +36,8 @@ class Tracing(DaemonTest):
     def setUp(self):
         self.root = pathlib.Path(self.make_root(self.addCleanup)).resolve()
         self.probes = self.root / "probes.plist"
-        self.write_probes([{"name": "beat", "kind": "count", "events": ["begin:decode", "talreporting:signpost_end"]},
+        self.write_probes([{"name": "beat", "kind": "count", "events": ["begin:decode", "talreporting:signpost_end",
+                                                                       "lttng_ust_statedump:start"]},
                            {"name": "gap", "kind": "interval", "begin": "end:decode", "end": "begin:decode"},
                            {"name": "load", "kind": "cpu"}])
 
@@ -67,8 +68,14 @@ class Tracing(DaemonTest):
         return json.loads(done.stdout)
 
     def test_signposts_of_a_program_are_counted_and_timed(self):
+        for trace_type in ("sktrace", "sktrace_profile"):
+            with self.subTest(trace_type):
+                self.check_signposts(trace_type)
+
+    def check_signposts(self, trace_type):
         told, log = self.traced_session(lambda: self.emit(TALREPORTING_SIGNPOSTS="1"),
-                                        TalReportingTestName="a known program", TalReportingPerfProcesses=["python3"])
+                                        TalReportingTraceType=trace_type, TalReportingTestName="a known program",
+                                        TalReportingPerfProcesses=["python3"])
         self.assertGreater(told["threads"], 1)
         results = self.root / "results/out.pdj"
         self.assertTrue(results.exists(), log)
@@ -88,6 +95,8 @@ class Tracing(DaemonTest):
         self.assertNotIn("foreign Total", metrics)
         self.assertEqual(metrics["beat begin:decode"]["value"], 20)
         self.assertEqual(metrics["beat talreporting:signpost_end"]["value"], 24)
+        other_providers = metrics["beat lttng_ust_statedump:start"]["value"]
+        self.assertEqual(other_providers > 0, trace_type == "sktrace_profile", other_providers)
         self.assertEqual(metrics["gap Total"]["count"], 19)
         self.assertIn("skipping probe load: the trace has no scheduler events", log)
 
