@@ -201,7 +201,7 @@ class FakeResults final : public PerfDataWriters, public ClientFiles {
   };
   struct Writer final : PerfDataWriter {
     explicit Writer(FakeResults& owner) : results(owner) {}
-    void addKeyVariables(const MessageDict& variables) override { results.variables.merge(variables); }
+    void addKeyVariables(const MessageDict& added) override { results.variables.merge(added); }
     void addMetric(PerfMetric metric) override { results.metrics.push_back(std::move(metric)); }
     void setTotalTime(double milliseconds, const std::vector<std::string>&) override {
       results.total_time = milliseconds;

@@ -10,21 +10,22 @@ namespace {
 
 namespace fs = std::filesystem;
 
-// Everything is found from where this program lies, so that an installation can be moved.
-fs::path beside(const char* relative) {
+// Everything is found from where this program lies, so that an installation can be moved; a directory that
+// the build names absolutely stays what it is.
+fs::path installed(const char* directory, const char* name) {
   std::error_code error;
   const fs::path program = fs::read_symlink("/proc/self/exe", error);
-  return (program.parent_path() / relative).lexically_normal();
+  return (program.parent_path() / ".." / directory / name).lexically_normal();
 }
 
 }  // namespace
 
 LinuxTracing::LinuxTracing(const Options& options)
-    : perftrail_({.helper = beside("../" TAL_LIBEXEC_DIR "/talreporting/tal-perftrail"),
+    : perftrail_({.helper = installed(TAL_LIBEXEC_DIR, "talreporting/tal-perftrail"),
                   .home = options.runtime_directory / "lttng",
                   .diagnostic_log = options.diagnostic_log,
                   .clock = options.clock}),
-      skein_(beside("../" TAL_LIB_DIR "/talreporting"), options.log),
+      skein_(installed(TAL_LIB_DIR, "talreporting"), options.log),
       client_files_(options.log_directory),
       platform_{.perftrail = perftrail_,
                 .skein = skein_,
