@@ -123,6 +123,7 @@ std::string perfText(const std::vector<std::string>& names, const std::vector<st
 
 void runPerfShow(const std::vector<std::string>& files, const Terminal& terminal) {
   std::vector<std::string> contents;
+  contents.reserve(files.size());
   for (const std::string& file : files) contents.push_back(contentOf(file));
   terminal.write(perfText(files, contents, terminal.width()));
 }

@@ -49,6 +49,7 @@ class ProbeFactoryClass final : public SkeinProbeFactoryClass {
   std::vector<std::unique_ptr<SkeinProbe>> probesWithDescriptions(
       const std::vector<SkeinProbeDescription>& descriptions, const SkeinTraceModel& trace) override {
     std::vector<std::unique_ptr<SkeinProbe>> probes;
+    probes.reserve(descriptions.size());
     for (const auto& description : descriptions) probes.push_back(makeProbe(description, contentOf(trace)));
     return probes;
   }
