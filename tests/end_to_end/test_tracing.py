@@ -29,6 +29,22 @@ work(b"org.example", b"foreign", 1)
 print(json.dumps({"times": times, "threads": len(os.listdir("/proc/self/task"))}))
 """
 
+NOBODY = 65534
+NOBODYS_CLIENT = """
+import sys, talreporting
+with talreporting.Client({socket!r}, timeout=120) as client:
+    client.create_reporting_session(8)
+    client.set_service_type(8, talreporting.SERVICE_TYPES["test"])
+    client.set_configuration(8, {{"TalReportingSkeinPlistFilePath": {probes!r},
+                                  "TalReportingSkeinOutputFileName": "out.pdj",
+                                  "TalReportingSkeinOutputFileDirectory": {results!r}}})
+    client.start_reporting_session(8)
+    client.get_all_reporters()
+    print("started", flush=True)
+    sys.stdin.readline()
+    client.stop_reporting_session(8)
+"""
+
 
 class Tracing(DaemonTest):
     config = {"device.toml": "InternalBuild = true\n"}
@@ -129,6 +145,35 @@ class Tracing(DaemonTest):
         _, log = self.traced_session()
         self.assertEqual(log.count("is not a valid path"), 1, log)
         self.assertNotIn("Performance Trace", log)
+
+    @unittest.skipUnless(os.geteuid() == 0, "only root can be another user's client")
+    def test_a_client_reaches_no_further_than_its_own_rights(self):
+        os.chmod(self.root, 0o755)
+        os.chmod(self.probes, 0o600)
+        before = len(self.daemon.log())
+        self.session_of_nobody()
+        self.assertIn("is not a valid path", self.daemon.log()[before:])
+
+        os.chmod(self.probes, 0o644)
+        before = len(self.daemon.log())
+        self.session_of_nobody()
+        self.assertIn("the client may not make results", self.daemon.log()[before:])
+        self.assertFalse((self.root / "results").exists())
+
+        (self.root / "results").mkdir()
+        os.chown(self.root / "results", NOBODY, NOBODY)
+        self.session_of_nobody()
+        self.assertEqual((self.root / "results/out.pdj").stat().st_uid, NOBODY)
+
+    def session_of_nobody(self):
+        script = NOBODYS_CLIENT.format(socket=self.daemon.socket_path, probes=str(self.probes),
+                                       results=str(self.root / "results"))
+        client = subprocess.Popen([sys.executable, "-c", script], user=NOBODY, group=NOBODY, extra_groups=[],
+                                  stdin=subprocess.PIPE, stdout=subprocess.PIPE, text=True)
+        self.assertEqual(client.stdout.readline(), "started\n")
+        self.emit(TALREPORTING_SIGNPOSTS="1")
+        client.communicate("stop\n", timeout=PATIENCE_SECONDS)
+        self.assertEqual(client.returncode, 0)
 
 
 if __name__ == "__main__":
