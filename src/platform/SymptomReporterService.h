@@ -60,8 +60,8 @@ class SymptomReporterService {
  public:
   /// Names a kind of fault; opaque to all but the service. Limits are kept by it.
   using Signature = MessageDict;
-  /// Called once, on the reporting queue, after the request has returned; not at
-  /// all when the host ends first.
+  /// Called once, on the reporting queue, before the request returns or later; not
+  /// at all when the host ends first.
   using Reply = std::function<void(const std::optional<MessageDict>& response)>;
 
   struct SignatureFields {

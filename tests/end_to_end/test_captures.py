@@ -71,6 +71,14 @@ class Captures(DaemonTest):
         self.assertNotIn("cancelled capture", daemon.log())
         client.stop_reporting_session(7)
         self.assertIn(f"cancelled capture {identifier}", daemon.log())
+        # The same in one breath: all of it may be one task of the daemon's.
+        hasty = self.session(daemon, 8, "alarms")
+        daemon.eventually(lambda: daemon.log().count("cancelled capture") == 1, "only one so far")
+        hasty.send_raw(b"".join([
+            *(talreporting.encode_frame([talreporting.SEND_MESSAGE, 0, {"issue_type": "LowRMS", "number": number}, ERROR,
+                                         ISSUE_DETECTOR, [8]]) for number in range(3)),
+            talreporting.encode_frame([talreporting.STOP, 0, 8])]))
+        daemon.eventually(lambda: daemon.log().count("cancelled capture") == 2, "cancelled again")
         self.assertEqual(daemon.terminate(), 0)
         self.assertEqual(self.names(), [])
 

@@ -135,7 +135,11 @@ bool CaptureService::startSession(Request request, std::shared_ptr<const Symptom
   const std::chrono::duration<double> duration(request.duration_seconds);
   dependencies_.reporting_queue.postAfter(std::chrono::duration_cast<std::chrono::nanoseconds>(duration),
                                           life_.guard([this, identifier] { timeIsOver(identifier); }));
-  answer(request.reply, {{kHoundDiagReplySuccess, true}, {kHoundDiagReplySessionID, identifier}});
+  // At once: who asked may be stopped in the very task that is running, and must
+  // know by then what to cancel.
+  if (request.reply) {
+    request.reply(MessageDict{{kHoundDiagReplySuccess, true}, {kHoundDiagReplySessionID, identifier}});
+  }
   return true;
 }
 

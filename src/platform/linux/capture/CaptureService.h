@@ -30,8 +30,9 @@ namespace tal {
 /// Lives on the reporting queue, which it holds for the decision alone: the rest
 /// is done on `work_queue`.
 ///
-/// A snapshot is answered when it is written; a timed capture when it is opened,
-/// and what becomes of it then only the log tells. Refusals:
+/// A snapshot is answered when it is written; a timed capture as it is opened,
+/// before the request returns, and what becomes of it then only the log tells.
+/// Refusals are answered later:
 ///
 /// | kHoundDiagError… | when |
 /// |---|---|

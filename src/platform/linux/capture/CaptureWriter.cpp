@@ -14,7 +14,8 @@ namespace tal {
 namespace {
 
 // What the bounds of its parts add up to: so much room is made before one is written.
-constexpr std::uint64_t kMostCaptureBytes = std::uint64_t{28} << 20;
+constexpr std::uint64_t kMostCaptureBytes = std::uint64_t{48} << 20;
+constexpr std::size_t kMostMessagesBytes = std::size_t{4} << 20;
 
 std::string jsonLine(const MessageDict& dict) {
   std::string text;
@@ -23,14 +24,23 @@ std::string jsonLine(const MessageDict& dict) {
   return text;
 }
 
-// One message a line.
+// One message a line; of more than the file may hold, the last ones.
 std::string messagesFile(const SymptomContext& context) {
-  std::string text;
-  for (const auto& each : context.last_messages) {
-    text += jsonLine({{"category", TalReportingUtilityCategoryString(each.category)},
-                      {"type", TalReportingUtilityTypeString(each.type)},
-                      {"message", each.message}});
+  std::vector<std::string> lines;  // the newest first
+  std::size_t bytes = 0;
+  const auto& messages = context.last_messages;
+  for (auto each = messages.rbegin(); each != messages.rend(); ++each) {
+    lines.push_back(jsonLine({{"category", TalReportingUtilityCategoryString(each->category)},
+                              {"type", TalReportingUtilityTypeString(each->type)},
+                              {"message", each->message}}));
+    bytes += lines.back().size();
+    if (bytes > kMostMessagesBytes) {
+      lines.pop_back();
+      break;
+    }
   }
+  std::string text;
+  for (auto line = lines.rbegin(); line != lines.rend(); ++line) text += *line;
   return text;
 }
 
