@@ -31,8 +31,19 @@ struct Part {
   NameChoice seen;
 };
 
-Part readPart(const std::filesystem::path& path, const EventQuery& query, const NameChoice& choice) {
+/// The events that one thread reads.
+struct Span {
+  std::int64_t after_id;
+  std::int64_t up_to_id;
+  std::optional<double> recorded_since;
+};
+
+Part readPart(const std::filesystem::path& path, const Span& span, const NameChoice& choice) {
   Part part;
+  EventQuery query;
+  query.after_id = span.after_id;
+  query.up_to_id = span.up_to_id;
+  query.recorded_since = span.recorded_since;
   StoreReading& reading = part.reading;
   EventStore store(path);
   store.forEach(query, [&](const StoredEvent& event) {
@@ -78,10 +89,10 @@ class Reader {
         events / kLeastEventsPerThread, 1, std::clamp(std::thread::hardware_concurrency(), 1U, kMostThreads));
     std::vector<std::future<Part>> parts;
     for (std::int64_t i = 0; i < threads; ++i) {
-      const EventQuery query{.recorded_since = since_,
-                             .after_id = after_ + events / threads * i,
-                             .up_to_id = i + 1 == threads ? newest_ : after_ + events / threads * (i + 1)};
-      parts.push_back(std::async(std::launch::async, readPart, path_, query, choice));
+      const Span span{.after_id = after_ + events / threads * i,
+                      .up_to_id = i + 1 == threads ? newest_ : after_ + events / threads * (i + 1),
+                      .recorded_since = since_};
+      parts.push_back(std::async(std::launch::async, readPart, path_, span, choice));
     }
     Part sum;
     for (auto& part : parts) add(sum, part.get());
