@@ -62,16 +62,16 @@ figure { margin: 0; }
 .line { position: absolute; left: 0; right: 0; border-top: 1px dashed var(--edge); }
 .line span { position: absolute; left: calc(100% + 0.4rem); top: -0.7em; font-size: 0.8rem; color: var(--soft);
   white-space: nowrap; }
-.columns { position: absolute; inset: 0; display: flex; gap: 2px; }
-.column { position: relative; flex: 1 1 0; min-width: 0; display: flex; flex-direction: column;
+.columns { position: absolute; inset: 0; display: flex; gap: 2px; justify-content: center; }
+.column { position: relative; flex: 1 1 0; min-width: 0; max-width: 5rem; display: flex; flex-direction: column;
   justify-content: flex-end; }
 .column:hover { background: var(--track); }
 .column i { display: block; min-height: 2px; }
 .column i:first-child { border-radius: 2px 2px 0 0; }
 .column.marked::after { content: ""; position: absolute; left: 50%; bottom: -0.6rem; width: 0.36rem; height: 0.36rem;
   margin-left: -0.18rem; border-radius: 50%; background: var(--bad); }
-.axis { display: flex; gap: 2px; margin: 0.7rem 3.6rem 0 0; height: 1.2rem; font-size: 0.8rem; color: var(--soft); }
-.axis span { flex: 1 1 0; min-width: 0; display: flex; justify-content: center; white-space: nowrap; }
+.axis { display: flex; gap: 2px; justify-content: center; margin: 0.7rem 3.6rem 0 0; height: 1.2rem; font-size: 0.8rem; color: var(--soft); }
+.axis span { flex: 1 1 0; min-width: 0; max-width: 5rem; display: flex; justify-content: center; white-space: nowrap; }
 .axis span b { flex: none; font-weight: 400; }
 .legend { display: flex; flex-wrap: wrap; gap: 0.25rem 1rem; margin-top: 0.5rem; font-size: 0.8rem; }
 .legend span::before { content: ""; display: inline-block; width: 0.7rem; height: 0.7rem; margin-right: 0.4rem;
