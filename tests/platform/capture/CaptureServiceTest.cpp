@@ -142,6 +142,10 @@ TEST_F(CaptureServiceTest, TimedCaptureIsWrittenAtItsEndUnlessCancelled) {
   client->cancelSession("20270115T080100Z-telephony-Energylog");
   client->cancelSession("20270115T080100Z-telephony-Energylog");
   EXPECT_TRUE(host.log.holds("no open capture is called NONE_RETURNED"));
+  ask({.type = "telephony", .seconds = 60, .timed = true});
+  settle();
+  EXPECT_THAT(replies.back(), HasSubstr("Success=1")) << "a cancelled one uses up no limit";
+  client->cancelSession("20270115T080100Z-telephony-Energylog-2");
   host.queue.advance(std::chrono::minutes(2));
   settle();
   EXPECT_EQ(captures().size(), 1U);
