@@ -64,6 +64,7 @@ DaemonUnderTest::DaemonUnderTest(const Options& options) {
   // The measurements are of speed; the quotas are what they are.
   writeSetting("org.vantle.talsys.ipc", "max_kept_mebibytes = 65536\n");
   writeSetting("org.vantle.talsys.store", "max_mebibytes = 65536\n");
+  if (options.rtc_store) writeSetting("org.vantle.talsys.rtc", "store = true\n");
   start(options.log_level);
 }
 
@@ -115,16 +116,26 @@ void DaemonUnderTest::end() {
 
 std::uint64_t DaemonUnderTest::endAndCountEvents(const std::string& name) {
   end();
+  return count("SELECT count(*) FROM events WHERE name = ?", name);
+}
+
+std::uint64_t DaemonUnderTest::endAndCountRtcMessages(int category) {
+  end();
+  return count("SELECT count(*) FROM rtc_messages WHERE category = CAST(? AS INTEGER)",
+               std::to_string(category));
+}
+
+std::uint64_t DaemonUnderTest::count(const std::string& query, const std::string& parameter) const {
   sqlite3* database = nullptr;
   sqlite3_stmt* statement = nullptr;
   sqlite3_open((root_ / "state" / "store.db").c_str(), &database);
-  sqlite3_prepare_v2(database, "SELECT count(*) FROM events WHERE name = ?", -1, &statement, nullptr);
-  sqlite3_bind_text(statement, 1, name.c_str(), -1, SQLITE_TRANSIENT);
+  sqlite3_prepare_v2(database, query.c_str(), -1, &statement, nullptr);
+  sqlite3_bind_text(statement, 1, parameter.c_str(), -1, SQLITE_TRANSIENT);
   if (sqlite3_step(statement) != SQLITE_ROW) throw std::runtime_error(sqlite3_errmsg(database));
-  const auto count = static_cast<std::uint64_t>(sqlite3_column_int64(statement, 0));
+  const auto rows = static_cast<std::uint64_t>(sqlite3_column_int64(statement, 0));
   sqlite3_finalize(statement);
   sqlite3_close(database);
-  return count;
+  return rows;
 }
 
 std::string DaemonUnderTest::statusField(const fs::path& file, const std::string& name) const {

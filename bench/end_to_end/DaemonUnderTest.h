@@ -18,6 +18,8 @@ class DaemonUnderTest {
   struct Options {
     /// The setting `wanted` of the analytics, as TOML.
     std::string wanted = "[]";
+    /// Whether real-time messages are kept in the store.
+    bool rtc_store = false;
     /// "error" leaves only the time that the lines themselves do not take.
     std::string log_level = "default";
   };
@@ -41,11 +43,14 @@ class DaemonUnderTest {
 
   /// Ends it in order and returns the number of events of this name in its store.
   std::uint64_t endAndCountEvents(const std::string& name);
+  /// Ends it in order and returns the number of real-time messages of this category.
+  std::uint64_t endAndCountRtcMessages(int category);
 
  private:
   void writeSetting(const std::string& domain, const std::string& text) const;
   void start(const std::string& log_level);
   void end();
+  std::uint64_t count(const std::string& query, const std::string& parameter) const;
   std::string statusField(const std::filesystem::path& file, const std::string& name) const;
 
   std::filesystem::path root_;

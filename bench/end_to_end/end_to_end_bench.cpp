@@ -125,6 +125,32 @@ Throughput stored(bool durable, std::size_t in_flight) {
   return throughput;
 }
 
+// Both events of each message, and the message itself as a real-time one.
+Throughput storedThrice() {
+  constexpr int kMessages = 500'000;
+  constexpr std::size_t kInFlight = 64;
+  constexpr int kPlayback = 4;
+  const Requests requests = messages(0, kMessages);
+  Requests last;
+  last.hello(true);
+  last.sendMessage(kMessages, kReporter);
+  DaemonUnderTest daemon({.wanted = "['*']", .rtc_store = true});
+  Throughput throughput;
+  {
+    Connection connection(daemon.socketPath());
+    startSession(connection, false);
+    throughput = throughputOf(daemon, kMessages, [&] {
+      connection.exchange(requests, kInFlight);
+      connection.exchange(last, 1);
+    });
+  }
+  const std::uint64_t found = daemon.endAndCountRtcMessages(kPlayback);
+  if (found != kMessages + 1) {
+    throw std::runtime_error(std::to_string(kMessages + 1 - found) + " messages are missing in the store");
+  }
+  return throughput;
+}
+
 double roundTripMicroseconds(const std::function<void()>& once) {
   constexpr int kWarmUp = 2'000;
   constexpr int kRounds = 20'000;
@@ -246,6 +272,9 @@ void run(std::string_view only) {
     throughput("12-key messages, 64 in flight, no event wanted, per ms", unstored(), 700);
   }
   if (chosen("stored")) throughput("the same, one event stored each, per ms", stored(false, 64), 190);
+  if (chosen("rtc")) {
+    throughput("the same, both events and the real-time message stored, per ms", storedThrice(), 100);
+  }
   if (chosen("durable")) {
     throughput("the same, durable acknowledgement, 1024 in flight, per ms", stored(true, 1024), 150);
   }
