@@ -35,7 +35,7 @@ OBJECTS = {
                           Icon=["s", "audio-headset"]),
                  "org.bluez.Battery1": {"Percentage": ["y", 70]}},
     HEADPHONES + "/service0001/char0002": {
-        "org.bluez.GattCharacteristic1": {"UUID": ["s", uuid("2a26")], "Value": ["ay", "2.1.0"]}},
+        "org.bluez.GattCharacteristic1": {"UUID": ["s", uuid("2a26")], "Value": ["ay", "2.1.0\0"]}},
     "/org/bluez/hci0/dev_2": device("AA:00:00:00:00:02", Alias=["s", "Speaker"], UUIDs=["as", [uuid("110b")]]),
     "/org/bluez/hci0/dev_3": device("AA:00:00:00:00:03", Name=["s", "Phone"], UUIDs=["as", [uuid("110a")]]),
     "/org/bluez/hci0/dev_4": {"org.bluez.Device1": {"Address": ["s", "AA:00:00:00:00:04"], "Class": ["u", 0x240404],

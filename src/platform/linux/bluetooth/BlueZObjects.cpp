@@ -107,7 +107,9 @@ class Reader {
       const void* bytes = nullptr;
       std::size_t size = 0;
       check(sd_bus_message_read_array(message_, 'y', &bytes, &size));
-      if (ok_ && size > 0) to = cut({static_cast<const char*>(bytes), size});
+      if (!ok_ || size == 0) return;
+      const std::string_view text(static_cast<const char*>(bytes), size);
+      to = cut(text.substr(0, text.find('\0')));  // some devices terminate it
     });
   }
 
