@@ -18,6 +18,10 @@ using namespace std::chrono_literals;
 
 // Read ahead of what the broker has confirmed, so that neither side waits.
 constexpr std::size_t kMostUnconfirmed = 8192;
+constexpr std::size_t kMostUnconfirmedBytes = std::size_t{8} * 1024 * 1024;
+// Past this many flushes that nobody has looked at, the second that a batch waits
+// at most has to do.
+constexpr std::size_t kMostFlushes = 1024;
 constexpr std::int64_t kMostReadAtOnce = 1024;
 // A committed row is seen this soon, as long as one is awaited.
 constexpr auto kLookForCommit = 10ms;
@@ -64,7 +68,7 @@ void MqttPublisher::messageWaits() {
 void MqttPublisher::flush(std::int64_t session) {
   {
     const std::lock_guard lock(flush_mutex_);
-    flush_.push_back(session);
+    if (flush_.size() < kMostFlushes) flush_.push_back(session);
   }
   messageWaits();
 }
@@ -104,6 +108,10 @@ void MqttPublisher::step() {
 
 bool MqttPublisher::mayHaveMore() const { return !has_read_all_ || !unconfirmed_.empty(); }
 
+bool MqttPublisher::hasRoom() const {
+  return unconfirmed_.size() < kMostUnconfirmed && unconfirmed_bytes_ < kMostUnconfirmedBytes;
+}
+
 void MqttPublisher::connect(Instant now) {
   if (!reader_) reader_ = std::make_unique<OutboxReader>(dependencies_.store_path);
   // Everything from here on; what was under way in an earlier connection as well.
@@ -111,6 +119,7 @@ void MqttPublisher::connect(Instant now) {
   told_through_ = read_through_ = std::max(told_through_, reader_->confirmedBy(address_.uri));
   in_flight_.clear();
   unconfirmed_.clear();
+  unconfirmed_bytes_ = 0;
   if (reader_->readAfter(read_through_, 1).empty()) {
     has_read_all_ = is_settled;
     next_attempt_ = now + kLookForCommit;
@@ -149,14 +158,15 @@ void MqttPublisher::readOutbox(Instant now) {
     // Only once what was sent before the flush can be read.
     if (dependencies_.store.settledThrough() >= awaited_row_) flush = std::exchange(flush_, {});
   }
-  while (!has_read_all_ && unconfirmed_.size() < kMostUnconfirmed) {
+  while (!has_read_all_ && hasRoom()) {
     const bool is_settled = dependencies_.store.settledThrough() >= awaited_row_;
     const auto messages = reader_->readAfter(read_through_, kMostReadAtOnce);
     for (const OutboxMessage& message : messages) {
       const double age = dependencies_.clock.secondsSince1970() - message.recorded_at;
       publications_->add(message, reader_->sessionOf(message.session), now,
                          std::chrono::duration<double>(age));
-      unconfirmed_.insert(message.number);
+      unconfirmed_.emplace(message.number, message.payload.size());
+      unconfirmed_bytes_ += message.payload.size();
       read_through_ = message.number;
     }
     if (messages.empty()) {
@@ -166,7 +176,7 @@ void MqttPublisher::readOutbox(Instant now) {
   }
   for (const std::int64_t session : flush) publications_->flush(session);
   // There is no room for what would fill the batches.
-  if (unconfirmed_.size() >= kMostUnconfirmed) publications_->flushAll();
+  if (!hasRoom()) publications_->flushAll();
 }
 
 void MqttPublisher::publishDue(Instant now) {
@@ -182,13 +192,17 @@ void MqttPublisher::publishDue(Instant now) {
 void MqttPublisher::confirmed(int identifier) {
   const auto found = in_flight_.find(identifier);
   if (found == in_flight_.end()) return;
-  for (const std::int64_t number : found->second) unconfirmed_.erase(number);
+  for (const std::int64_t number : found->second) {
+    const auto message = unconfirmed_.find(number);
+    unconfirmed_bytes_ -= message->second;
+    unconfirmed_.erase(message);
+  }
   in_flight_.erase(found);
   failures_ = 0;
 }
 
 void MqttPublisher::tellStore(Instant now) {
-  const std::int64_t through = unconfirmed_.empty() ? read_through_ : *unconfirmed_.begin() - 1;
+  const std::int64_t through = unconfirmed_.empty() ? read_through_ : unconfirmed_.begin()->first - 1;
   if (through <= told_through_) return;
   if (!unconfirmed_.empty() && now < told_at_ + kTellStoreEvery) return;
   told_through_ = through;
@@ -232,7 +246,7 @@ int MqttPublisher::pauseUntilNextEvent(Instant now) const {
   } else if (!connection_->isUp()) {
     at(attempt_ends_);
   } else {
-    if (!has_read_all_ && unconfirmed_.size() < kMostUnconfirmed) at(now + kLookForCommit);
+    if (!has_read_all_ && hasRoom()) at(now + kLookForCommit);
     if (const auto due = publications_->nextDue()) at(*due);
     if (unconfirmed_.empty() && has_read_all_) at(idle_since_ + kIdleBeforeLeaving);
   }

@@ -3,11 +3,11 @@
 #include <atomic>
 #include <chrono>
 #include <cstdint>
+#include <map>
 #include <memory>
 #include <mutex>
 #include <optional>
 #include <random>
-#include <set>
 #include <string>
 #include <thread>
 #include <unordered_map>
@@ -52,6 +52,7 @@ class MqttPublisher {
   void step();
   void readOutbox(Instant now);
   bool mayHaveMore() const;
+  bool hasRoom() const;
   void connect(Instant now);
   void publishDue(Instant now);
   void confirmed(int identifier);
@@ -76,7 +77,7 @@ class MqttPublisher {
   std::unique_ptr<MqttConnection> connection_;
   std::optional<Publications> publications_;
   std::unordered_map<int, std::vector<std::int64_t>> in_flight_;
-  std::set<std::int64_t> unconfirmed_;  // read, of this connection
+  std::map<std::int64_t, std::size_t> unconfirmed_;  // read, with their bytes
   std::size_t unconfirmed_bytes_ = 0;
   std::int64_t read_through_ = 0;
   std::int64_t told_through_ = 0;  // what the store knows

@@ -5,6 +5,7 @@ namespace tal {
 namespace {
 // What a session tells of itself does not change; there may be many sessions.
 constexpr std::size_t kMostSessionsKept = 256;
+constexpr std::size_t kMostBytesAtOnce = std::size_t{1024} * 1024;
 }  // namespace
 
 OutboxReader::OutboxReader(const std::filesystem::path& store)
@@ -35,14 +36,17 @@ std::vector<OutboxMessage> OutboxReader::readAfter(std::int64_t number, std::int
   std::vector<OutboxMessage> result;
   messages_.bind(1, number);
   messages_.bind(2, most);
-  while (messages_.step()) {
+  std::size_t bytes = 0;
+  while (bytes < kMostBytesAtOnce && messages_.step()) {
     result.push_back({.number = messages_.integerAt(0),
                       .session = messages_.integerAt(1),
                       .recorded_at = messages_.doubleAt(2),
                       .category = messages_.integerAt(3),
                       .type = messages_.integerAt(4),
                       .payload = std::string(messages_.textAt(5))});
+    bytes += result.back().payload.size();
   }
+  messages_.reset();
   return result;
 }
 

@@ -21,7 +21,8 @@ class OutboxReader {
   std::vector<std::string> brokers();
   /// The message up to which the broker has everything.
   std::int64_t confirmedBy(const std::string& broker);
-  /// The committed messages behind this one, in order.
+  /// The committed messages behind this one, in order, as many as asked for at
+  /// most and about a mebibyte.
   std::vector<OutboxMessage> readAfter(std::int64_t number, std::int64_t most);
   /// Valid until the next call.
   const OutboxSession& sessionOf(std::int64_t row);
