@@ -12,6 +12,7 @@
 #include "platform/linux/ipc/IpcSettings.h"
 #include "platform/linux/ipc/ServiceManager.h"
 #include "platform/linux/logging/JournalLogSink.h"
+#include "platform/linux/logging/RepeatedLines.h"
 #include "platform/linux/process/StartupError.h"
 #include "service/WorkerRosterTable.h"
 
@@ -60,7 +61,7 @@ void raiseDescriptorLimit(std::size_t connections) {
 Daemon::Daemon(const DaemonOptions& options, const std::string& version)
     : directories_(preparedDirectories(options)),
       lock_(directories_.state),
-      log_sink_(makeLogSink(options.log_to)),
+      log_sink_(std::make_unique<RepeatedLines>(makeLogSink(options.log_to), clock_)),
       startup_log_(log_sink_.get(), options.log_level),
       device_properties_(directories_.config, startup_log_.service),
       internal_build_(TalReportingUtilityIsInternalBuild(device_properties_)),

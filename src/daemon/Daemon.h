@@ -68,10 +68,10 @@ class Daemon {
 
   const Directories directories_;
   const InstanceLock lock_;
+  LinuxClock clock_;
   const std::unique_ptr<LogSink> log_sink_;
   // For what is read before it is known whether the build is internal.
   const LogChannels startup_log_;
-  LinuxClock clock_;
   SdtTracePoints trace_points_;
   LinuxProcessTable processes_;
   DeviceTomlProperties device_properties_;
