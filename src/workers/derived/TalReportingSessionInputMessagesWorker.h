@@ -15,13 +15,14 @@ namespace tal {
 
 /// A summary is a message of category Input, type Summary, with the keys
 ///
-/// | key | value |
-/// |---|---|
-/// | "HostApplicationDisplayID" | the host application |
-/// | "inputrunning_seconds", "inputrunning_secondsBucketed" | seconds (32-bit float), and their bucket as
-/// text | | "vp_config_operation_mode", "vp_config_input_port", "active_devices" | as last reported,
-/// "unknown" until then | | "vocoders" | "codec:rate" of each codec taken up, ascending, joined by ",";
-/// absent without any | | "msgidx", "msgcnt" | which of how many, from 1 |
+/// - "HostApplicationDisplayID": the host application;
+/// - "inputrunning_seconds", "inputrunning_secondsBucketed": seconds (32-bit
+///   float), and their bucket as text;
+/// - "vp_config_operation_mode", "vp_config_input_port", "active_devices": as last
+///   reported, "unknown" until then;
+/// - "vocoders": "codec:rate" of each codec taken up, ascending, joined by ",";
+///   absent without any;
+/// - "msgidx", "msgcnt": which of how many, from 1.
 class TalReportingSessionInputMessagesWorker final : public TalReportingSessionWorker {
  public:
   /// `session` outlives the worker.

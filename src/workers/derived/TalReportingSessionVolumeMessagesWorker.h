@@ -15,14 +15,16 @@ namespace tal {
 
 /// A summary is a message of category Volume, type Summary, with the keys
 ///
-/// | key | value |
-/// |---|---|
-/// | "session_selected_format", "mFormatID", "active_devices" | as last reported, "unknown" until then |
-/// | "HostApplicationDisplayID" | the host application |
-/// | "RvSessionVolume", "RvSessionVolumeBucketed" | gain, and its bucket as text |
-/// | "play_seconds", "play_secondsBucketed" | seconds played (32-bit float), and their bucket as text |
-/// | "spatial-audio-accessory-feature", "spatializationEnabled", "ringerstate" | as last reported, else false
-/// | | "mChannelsPerFrame" | as last reported, else -1 | | "msgidx", "msgcnt" | which of how many, from 1 |
+/// - "session_selected_format", "mFormatID", "active_devices": as last reported,
+///   "unknown" until then;
+/// - "HostApplicationDisplayID": the host application;
+/// - "RvSessionVolume", "RvSessionVolumeBucketed": gain, and its bucket as text;
+/// - "play_seconds", "play_secondsBucketed": seconds played (32-bit float), and
+///   their bucket as text;
+/// - "spatial-audio-accessory-feature", "spatializationEnabled", "ringerstate": as
+///   last reported, else false;
+/// - "mChannelsPerFrame": as last reported, else -1;
+/// - "msgidx", "msgcnt": which of how many, from 1.
 class TalReportingSessionVolumeMessagesWorker final : public TalReportingSessionWorker {
  public:
   /// `session` outlives the worker.
