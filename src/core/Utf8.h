@@ -33,4 +33,9 @@ constexpr std::size_t utf8SequenceLength(std::string_view text) {
   return !overlong && !beyond && continues(2) && continues(3) ? 4 : 0;
 }
 
+/// True for U+0080 to U+009F, which terminals read as control sequences.
+constexpr bool isC1Control(std::string_view sequence) {
+  return sequence.size() == 2 && sequence[0] == '\xC2' && static_cast<unsigned char>(sequence[1]) < 0xA0;
+}
+
 }  // namespace tal

@@ -16,6 +16,7 @@ TEST(SafeInFileName, KeepsWhatIsHarmless) {
       {"../../etc/passwd", "___.._etc_passwd"},
       {"...", "___"},
       {"a\nb\x7F", "a_b_"},
+      {"\xC2\x9Bm\xC2\xA0", "_m\xC2\xA0"},
       {std::string("a\0b", 3), "a_b"},
       {"", ""},
       {eighty + "y", eighty},

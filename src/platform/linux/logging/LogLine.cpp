@@ -32,11 +32,6 @@ void appendEscapedByte(std::string& out, char byte) {
 
 bool isPlain(char byte) { return byte >= ' ' && byte < '\x7f'; }
 
-// U+0080 to U+009F, which terminals read as control sequences.
-bool isC1Control(std::string_view sequence) {
-  return sequence.size() == 2 && sequence[0] == '\xc2' && static_cast<unsigned char>(sequence[1]) < 0xa0;
-}
-
 }  // namespace
 
 void appendEscaped(std::string& out, std::string_view text) {
