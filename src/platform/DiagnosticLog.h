@@ -16,7 +16,9 @@ class DiagnosticFile {
   /// A file that was not closed is closed without an answer.
   virtual ~DiagnosticFile() = default;
 
-  /// Bytes may stay in memory until `close`, which then tells of their failure.
+  /// Bytes may stay in memory until `close`, which then tells of their failure. A
+  /// failure is told once, and what is written after it is dropped: a full disk is
+  /// one line in the log, however much there was to write.
   virtual Error write(std::string_view bytes) = 0;
   virtual Error close() = 0;
 };

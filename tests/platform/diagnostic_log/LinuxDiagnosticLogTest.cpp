@@ -1,3 +1,4 @@
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/resource.h>
 #include <sys/stat.h>
@@ -5,6 +6,7 @@
 #include <csignal>
 #include <filesystem>
 #include <string>
+#include <vector>
 
 #include "platform/TemporaryDirectory.h"
 #include "platform/linux/diagnostic_log/LinuxDiagnosticLog.h"
@@ -13,6 +15,7 @@ namespace tal {
 namespace {
 
 namespace fs = std::filesystem;
+using ::testing::ElementsAre;
 
 class DiagnosticLogOnDisk : public ::testing::Test {
  protected:
@@ -71,20 +74,28 @@ TEST_F(DiagnosticLogOnDisk, MissingLogIsAnErrorAndNoMore) {
 }
 
 // A limit on the size of files stands in for a full disk.
-TEST_F(DiagnosticLogOnDisk, DiskThatIsFullIsToldOf) {
+TEST_F(DiagnosticLogOnDisk, DiskThatIsFullIsToldOfOnce) {
   ASSERT_EQ(log.makeDirectory("Audio"), std::nullopt);
-  auto opened = log.createFile("Audio", "report.json");
-  ASSERT_TRUE(opened.file);
-  EXPECT_EQ(opened.file->write("small enough to wait in memory"), std::nullopt);
-  rlimit before{};
-  getrlimit(RLIMIT_FSIZE, &before);
-  const rlimit tiny{.rlim_cur = 8, .rlim_max = before.rlim_max};
-  const auto handler = std::signal(SIGXFSZ, SIG_IGN);
-  setrlimit(RLIMIT_FSIZE, &tiny);
-  const DiagnosticFile::Error error = opened.file->close();
-  setrlimit(RLIMIT_FSIZE, &before);
-  std::signal(SIGXFSZ, handler);
-  EXPECT_EQ(error, "File too large");
+  std::vector<DiagnosticFile::Error> errors;  // of each write, then of the closing
+  const auto writeToFullDisk = [&](const std::string& name, const std::vector<std::size_t>& sizes) {
+    errors.clear();
+    auto opened = log.createFile("Audio", name);
+    ASSERT_TRUE(opened.file);
+    rlimit before{};
+    getrlimit(RLIMIT_FSIZE, &before);
+    const rlimit tiny{.rlim_cur = 8, .rlim_max = before.rlim_max};
+    const auto handler = std::signal(SIGXFSZ, SIG_IGN);
+    setrlimit(RLIMIT_FSIZE, &tiny);
+    for (const std::size_t size : sizes) errors.push_back(opened.file->write(std::string(size, 'x')));
+    errors.push_back(opened.file->close());
+    setrlimit(RLIMIT_FSIZE, &before);
+    std::signal(SIGXFSZ, handler);
+  };
+  const DiagnosticFile::Error none;
+  writeToFullDisk("small", {30});  // waits in memory
+  EXPECT_THAT(errors, ElementsAre(none, "File too large"));
+  writeToFullDisk("large", {200'000, 200'000, 7, 300'000, 7});
+  EXPECT_THAT(errors, ElementsAre(none, "File too large", none, none, none, none));
 }
 
 }  // namespace

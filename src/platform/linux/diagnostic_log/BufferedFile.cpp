@@ -25,6 +25,7 @@ BufferedFile::~BufferedFile() {
 }
 
 DiagnosticFile::Error BufferedFile::write(std::string_view bytes) {
+  if (failed_) return std::nullopt;  // told already, and the rest would not make the file whole
   if (buffer_.size() + bytes.size() > kBufferBytes) {
     if (Error error = flush()) return error;
   }
@@ -45,11 +46,14 @@ DiagnosticFile::Error BufferedFile::flush() {
   return error;
 }
 
-DiagnosticFile::Error BufferedFile::writeAll(std::string_view bytes) const {
+DiagnosticFile::Error BufferedFile::writeAll(std::string_view bytes) {
   while (!bytes.empty()) {
     const ssize_t written = ::write(descriptor_, bytes.data(), bytes.size());
     if (written < 0 && errno == EINTR) continue;
-    if (written < 0) return reasonOf(errno);
+    if (written < 0) {
+      failed_ = true;
+      return reasonOf(errno);
+    }
     bytes.remove_prefix(static_cast<std::size_t>(written));
   }
   return std::nullopt;

@@ -22,10 +22,11 @@ class BufferedFile final : public DiagnosticFile {
 
  private:
   Error flush();
-  Error writeAll(std::string_view bytes) const;
+  Error writeAll(std::string_view bytes);
 
   int descriptor_;
   std::string buffer_;
+  bool failed_ = false;
 };
 
 }  // namespace tal
