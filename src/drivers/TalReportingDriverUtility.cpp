@@ -117,8 +117,9 @@ void TalReportingDriverUtility::sendDriverLogsForSession(TalReportingSession& se
 void TalReportingDriverUtility::collect(const TalReportingIOChannelSubscription& subscription,
                                         const SnapShot* driver_snap_shot, DriverStats& stats) {
   TAL_LOG_INFO(log_, "getting latest samples");
-  const auto latest = checked(feed_.createSamples(*subscription.subscription));
+  auto samples = feed_.createSamples(*subscription.subscription);
   TAL_LOG_INFO(log_, "done getting latest samples");
+  const auto latest = checked(std::move(samples));
   if (!latest || !driver_snap_shot) return;
   // The feed answers with an error where the driver is not in the snapshot.
   const auto first = driver_snap_shot->find(subscription.driver.description());

@@ -183,6 +183,18 @@ TEST_F(DriverUtility, AFailureCostsItsDriverAloneAndIsSilentWithoutAnErrorValue)
   EXPECT_EQ(host.log.count("done getting latest samples"), 4U);
 }
 
+TEST_F(DriverUtility, ALateFailureIsLoggedWhenTheSamplingIsDone) {
+  driver("Tx-*").channels = {simple("n", 5)};
+  auto utility = makeUtility();
+  driver("Tx-*").samples_error = 5;
+  host.log.lines.clear();
+  utility.sendDriverLogsForSession(session(), nullptr);
+  std::vector<std::string> lines;
+  for (const auto& line : host.log.lines) lines.push_back(line.text);
+  EXPECT_THAT(lines, ElementsAre("getting latest samples", "done getting latest samples",
+                                 "DrvstatCreateSamples error 5"));
+}
+
 TEST_F(DriverUtility, WithoutASnapshotNothingIsReported) {
   driver("Tx-*").channels = {simple("n", 5)};
   auto utility = makeUtility();
