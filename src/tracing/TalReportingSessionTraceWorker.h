@@ -98,11 +98,13 @@ class TalReportingSessionTraceWorker final : public TalReportingSessionWorker {
   std::vector<SkeinProbeDescription> collectProbes();
   std::vector<std::string> perfProcesses() const;
   std::unique_ptr<SkeinTraceModel> makeTraceModel(const std::string& trace_url);
+  std::unique_ptr<SkeinSignpostModel> makeSignpostModel(const SkeinTraceModel& trace_model);
   bool createPDWriter();
   std::string outputFileName() const;
   void processSignposts(const SkeinSignpostModel& signpost_model);
   void processProbe(const SkeinProbe& probe);
   void writeResults();
+  void dropWriter();
 
   TalReportingSession& session_;
   const TracingPlatform& tracing_;

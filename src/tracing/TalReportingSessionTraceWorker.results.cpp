@@ -82,14 +82,9 @@ void TalReportingSessionTraceWorker::processTraceSkein(const std::string& trace_
   const auto trace_model = makeTraceModel(trace_url);
   if (!trace_model || !createPDWriter()) return;
 
-  if (SkeinSignpostModelClass* signpost_class = skein_.signpostModel()) {
-    const auto signposts = signpost_class->modelWithTraceModel(*trace_model);
-    if (signposts.model) {
-      processSignposts(*signposts.model);
-    } else {
-      TAL_LOG_ERROR(log(), "failed to create Skein signpost model: ", signposts.error);
-    }
-  }
+  const auto signposts = makeSignpostModel(*trace_model);
+  if (!signposts) return dropWriter();
+  processSignposts(*signposts);
   if (SkeinProbeFactoryClass* factory = skein_.probeFactory()) {
     for (const auto& probe : factory->probesWithDescriptions(descriptions, *trace_model)) {
       processProbe(*probe);
@@ -159,6 +154,16 @@ std::unique_ptr<SkeinTraceModel> TalReportingSessionTraceWorker::makeTraceModel(
     TAL_LOG_ERROR(log(), "the trace lacks ", discarded,
                   " events that the tracer had no room for: ", trace_url);
   }
+  return std::move(result.model);
+}
+
+std::unique_ptr<SkeinSignpostModel> TalReportingSessionTraceWorker::makeSignpostModel(
+    const SkeinTraceModel& trace_model) {
+  SkeinResult<SkeinSignpostModel> result{.model = nullptr, .error = "the library has no such class"};
+  if (SkeinSignpostModelClass* model_class = skein_.signpostModel()) {
+    result = model_class->modelWithTraceModel(trace_model);
+  }
+  if (!result.model) TAL_LOG_ERROR(log(), "failed to create Skein signpost model: ", result.error);
   return std::move(result.model);
 }
 
@@ -263,6 +268,10 @@ void TalReportingSessionTraceWorker::writeResults() {
       TAL_LOG(log(), "moving ", full_writer_path_, " into place: ", *move_error);
     }
   }
+  dropWriter();
+}
+
+void TalReportingSessionTraceWorker::dropWriter() {
   writer_.reset();
   results_directory_.reset();
   total_time_value_ = 0;

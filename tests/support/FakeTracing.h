@@ -95,6 +95,7 @@ class FakeSkein final : public SkeinLibrary,
 
   bool absent = false;
   std::string trace_error;
+  std::string signposts_error;
   std::uint64_t discarded = 0;
   std::vector<SkeinSignpost> signposts;
   std::map<std::string, std::vector<SkeinProbe::Series>> series;  // by the probe's name
@@ -132,6 +133,7 @@ class FakeSkein final : public SkeinLibrary,
     return {std::make_unique<Trace>(discarded), ""};
   }
   SkeinResult<SkeinSignpostModel> modelWithTraceModel(const SkeinTraceModel&) override {
+    if (!signposts_error.empty()) return {nullptr, signposts_error};
     return {std::make_unique<Signposts>(signposts), ""};
   }
   std::vector<std::unique_ptr<SkeinProbe>> probesWithDescriptions(

@@ -207,6 +207,8 @@ TEST_F(TraceWorker, FailuresOnTheWayToTheResultsAreLoggedOnce) {
        false},
       {"corrupt trace", [](auto& t) { t.skein.trace_error = "truncated"; },
        "failed to create Skein model: truncated", false},
+      {"no signposts", [](auto& t) { t.skein.signposts_error = "no memory"; },
+       "failed to create Skein signpost model: no memory", false},
       {"directory refused", [](auto& t) { t.results.directory_error = "read-only"; },
        "can't create logging directory at /log/Audio/Traces: read-only", false},
       {"file refused", [](auto& t) { t.results.write_error = "disk full"; },
@@ -230,6 +232,7 @@ TEST_F(TraceWorker, FailuresOnTheWayToTheResultsAreLoggedOnce) {
     tracing.results.files["/probes.plist"] = "good";
     tracing.lists.values["good"] = list;
     tracing.skein.trace_error.clear();
+    tracing.skein.signposts_error.clear();
     tracing.skein.discarded = 0;
     tracing.results.directory_error = tracing.results.write_error = tracing.results.move_error = std::nullopt;
   }
