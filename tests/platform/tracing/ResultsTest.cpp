@@ -34,19 +34,33 @@ TEST(PropertyLists, ReadsWhatTheSystemWritesItself) {
   EXPECT_EQ(*read.value, value) << read.value->text();
 }
 
+std::string repeated(int times, const std::string& text) {
+  std::string all;
+  for (int i = 0; i < times; ++i) all += text;
+  return all;
+}
+
+TEST(PropertyLists, ReadsWideAndDeepOnes) {
+  for (const std::string& list : {"<array>" + repeated(500, "<array/>") + "</array>",
+                                  repeated(2000, "<array>") + repeated(2000, "</array>")}) {
+    const auto read = XmlPropertyLists().valueFromXml("<plist>" + list + "</plist>");
+    EXPECT_TRUE(read.value) << read.error;
+  }
+}
+
 TEST(PropertyLists, RefusesWhatIsNone) {
   const std::string head = "<?xml version=\"1.0\"?><plist version=\"1.0\">";
-  std::string deep = head;
-  for (int i = 0; i < 100'000; ++i) deep += "<array>";
-  const std::string bad[] = {"",
-                             "not XML",
-                             "{\"json\": 1}",
-                             std::string("bplist00\xd0\x08\0\0", 12),
-                             head,
-                             head + "<dict><key>a</key></dict",
-                             head + "<dict><string>no key</string></dict></plist>",
-                             head + "<nonsense/></plist>",
-                             deep};
+  const std::string bad[] = {
+      "",
+      "not XML",
+      "{\"json\": 1}",
+      std::string("bplist00\xd0\x08\0\0", 12),
+      head,
+      head + "<dict><key>a</key></dict",
+      head + "<dict><string>no key</string></dict></plist>",
+      head + "<nonsense/></plist>",
+      head + repeated(100'000, "<array>"),
+      head + repeated(30'000, "<array><!--</array>-->") + repeated(30'000, "</array>") + "</plist>"};
   for (const std::string& xml : bad) {
     const auto read = XmlPropertyLists().valueFromXml(xml);
     EXPECT_FALSE(read.value) << xml.substr(0, 80) << " -> " << read.value->text();

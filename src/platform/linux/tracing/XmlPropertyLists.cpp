@@ -5,6 +5,7 @@
 #include <cstdlib>
 #include <limits>
 #include <memory>
+#include <string>
 #include <utility>
 
 #include "core/MessageDict.h"
@@ -13,8 +14,9 @@ namespace tal {
 
 namespace {
 
-// The library frees nested nodes by recursion, so what comes from outside is looked at first.
-constexpr int kDeepestNesting = 32;
+// The library frees nested nodes by recursion, and the values made of them are read by recursion, so what
+// comes from outside is looked at first. Nothing nests deeper than it has containers.
+constexpr std::size_t kMostContainers = 2000;
 
 struct FreePlist {
   void operator()(void* node) const { plist_free(node); }
@@ -25,18 +27,14 @@ struct FreeMemory {
   void operator()(void* memory) const { std::free(memory); }
 };
 
-// Counts elements that are open at one time; an upper bound, since comments count too.
-bool nestsTooDeeply(std::string_view xml) {
-  int depth = 0;
+// Wherever they begin: to tell those within comments, one would have to see comments as the library does.
+bool hasTooManyContainers(std::string_view xml) {
+  std::size_t containers = 0;
   for (std::size_t at = xml.find('<'); at != std::string_view::npos; at = xml.find('<', at + 1)) {
     const std::string_view rest = xml.substr(at + 1);
-    if (rest.starts_with("/array") || rest.starts_with("/dict")) {
-      --depth;
-    } else if (rest.starts_with("array") || rest.starts_with("dict")) {
-      if (++depth > kDeepestNesting) return true;
-    }
+    if (rest.starts_with("array") || rest.starts_with("dict")) ++containers;
   }
-  return false;
+  return containers > kMostContainers;
 }
 
 MessageValue valueOf(plist_t node);
@@ -119,7 +117,10 @@ MessageValue valueOf(plist_t node) {
 PropertyLists::Result XmlPropertyLists::valueFromXml(std::string_view xml) const {
   if (xml.size() > std::numeric_limits<std::uint32_t>::max())
     return {std::nullopt, "the property list is too large"};
-  if (nestsTooDeeply(xml)) return {std::nullopt, "the property list nests too deeply"};
+  if (hasTooManyContainers(xml)) {
+    return {std::nullopt,
+            "the property list has over " + std::to_string(kMostContainers) + " arrays and dictionaries"};
+  }
   plist_t root = nullptr;
   plist_from_xml(xml.data(), static_cast<std::uint32_t>(xml.size()), &root);
   const Plist owned(root);
