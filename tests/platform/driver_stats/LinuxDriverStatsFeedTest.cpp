@@ -240,19 +240,21 @@ TEST_F(DriverStatsOfMachine, ABadDropInFileIsOneLineAndLeavesTheOthersAlone) {
 TEST_F(DriverStatsOfMachine, AChannelWhoseFileIsBadIsLeftOutAndSaidOnceUntilItIsGood) {
   dropIn("a.json", R"({"group": "pdm", "channels": [
       {"name": "missing", "file": "/missing", "format": "simple"},
-      {"name": "good", "file": "/good", "format": "simple"}]})");
+      {"name": "good", "file": "/good", "format": "simple"},
+      {"name": "mistaken", "file": "/good", "format": "histogram"}]})");
   write("good", "5\n");
   const auto pdm = subscribe("pdm");
   const auto before = sample(*pdm);
-  ASSERT_THAT(lines.lines(), SizeIs(1));
+  ASSERT_THAT(lines.lines(), SizeIs(2));
   EXPECT_THAT(lines.lines()[0], HasSubstr("channel missing is left out: /missing: No such file"));
   write("good", "6\n");
   write("missing", "5\n");
   EXPECT_THAT(since(*before, *pdm), ElementsAre("good 1")) << "the other has nothing to be compared with";
   write("missing", "five\n");
   EXPECT_THAT(since(*before, *pdm), ElementsAre("good 1"));
-  ASSERT_THAT(lines.lines(), SizeIs(2));
-  EXPECT_THAT(lines.lines()[1], HasSubstr("/missing: is not of its format"));
+  ASSERT_THAT(lines.lines(), SizeIs(3)) << "that the same file is good for another channel changes nothing";
+  EXPECT_THAT(lines.lines()[1], HasSubstr("channel mistaken is left out: /good: is not of its format"));
+  EXPECT_THAT(lines.lines()[2], HasSubstr("/missing: is not of its format"));
 }
 
 TEST_F(DriverStatsOfMachine, ASourceThatIsThereAndCannotBeReadFailsTheDriver) {

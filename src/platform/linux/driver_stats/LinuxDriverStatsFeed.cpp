@@ -117,10 +117,10 @@ ChannelReadings LinuxDriverStatsFeed::read(const DriverStatsChannelSet& wanted) 
 void LinuxDriverStatsFeed::readDropIn(const DropInChannel& channel, ChannelReadings& readings) {
   const HostFiles::Content content = files_.read(channel.file);
   if (content.ok() && parseInto(readings, channel, content.text)) {
-    complained_about_.erase(channel.file);
+    complained_about_.erase(&channel);
     return;
   }
-  if (!complained_about_.insert(channel.file).second) return;
+  if (!complained_about_.insert(&channel).second) return;
   const std::string reason =
       content.ok() ? "is not of its format" : std::generic_category().message(content.error);
   TAL_LOG(log_, "driver statistics channel ", *channel.description.channel_name,

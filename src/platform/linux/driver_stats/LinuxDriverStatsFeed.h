@@ -49,7 +49,7 @@ class LinuxDriverStatsFeed final : public DriverStatsFeed {
   const HostFiles files_;
   SoundHardware hardware_;
   std::optional<std::vector<DropInChannel>> drop_ins_;
-  std::set<std::string> complained_about_;  // files of drop-in channels
+  std::set<const DropInChannel*> complained_about_;  // of those above
 };
 
 }  // namespace tal
