@@ -120,6 +120,21 @@ class Activation(unittest.TestCase):
             self.assertTrue(os.path.exists(path))
             self.assertFalse(os.path.exists(f"{root}/run/talreporting.sock"))
 
+    def test_no_file_of_the_daemon_takes_the_place_of_a_missing_standard_descriptor(self):
+        with tempfile.TemporaryDirectory() as root, socket.socket(socket.AF_UNIX) as listening:
+            listening.bind(f"{root}/given.sock")
+            listening.listen()
+            command = (f'exec 3<&{listening.fileno()}; export LISTEN_FDS=1 LISTEN_PID=$$; '
+                       'exec "$0" --root "$1" --log-level debug <&- >&- 2>&-')
+            client = talreporting.Client(f"{root}/given.sock", timeout=PATIENCE_SECONDS)
+            with client, subprocess.Popen(["sh", "-c", command, BIN_DIR / "talreportingd", root],
+                                          pass_fds=[listening.fileno()]) as process:
+                client.get_all_reporters()
+                files = [os.readlink(f"/proc/{process.pid}/fd/{number}") for number in range(3)]
+                process.terminate()
+                self.assertEqual(process.wait(PATIENCE_SECONDS), 0)
+            self.assertEqual(files, ["/dev/null"] * 3)
+
 
 class Retention(DaemonTest):
     config = {STORE_SETTINGS: "max_mebibytes = 1\n"}
