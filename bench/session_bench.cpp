@@ -123,6 +123,10 @@ class NoDiagnosticLog final : public DiagnosticLog {
   std::string pathOf(std::string_view place) const override { return std::string(place); }
   DiagnosticFile::Error makeDirectory(std::string_view) override { return std::nullopt; }
   Opened createFile(std::string_view, std::string_view) override { return {nullptr, "none here"}; }
+  DiagnosticFile::Error putFile(std::string_view, std::string_view, std::string_view) override {
+    return "none here";
+  }
+  void keepLast(std::string_view, std::size_t) override {}
 };
 
 class NoDrivers final : public DriverStatsFeed {

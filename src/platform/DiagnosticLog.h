@@ -1,5 +1,6 @@
 #pragma once
 
+#include <cstddef>
 #include <memory>
 #include <optional>
 #include <string>
@@ -44,6 +45,15 @@ class DiagnosticLog {
   /// Creates a file that does not exist yet. Since everyone may write to these
   /// directories, no link is followed and nothing that exists is opened.
   virtual Opened createFile(std::string_view place, std::string_view name) = 0;
+
+  /// Writes a file elsewhere and moves it into the place when it is whole: neither a
+  /// full disk nor the end of the process leaves half of it under its name.
+  virtual DiagnosticFile::Error putFile(std::string_view place, std::string_view name,
+                                        std::string_view text) = 0;
+
+  /// Removes files that are the daemon's own from the place, the first by name first,
+  /// until there are `most`. Files that it began to put and never finished go before all others.
+  virtual void keepLast(std::string_view place, std::size_t most) = 0;
 };
 
 }  // namespace tal

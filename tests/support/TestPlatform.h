@@ -2,7 +2,9 @@
 
 // One recording fake for each platform interface, and the bundle of them.
 
+#include <algorithm>
 #include <array>
+#include <cstddef>
 #include <functional>
 #include <map>
 #include <memory>
@@ -143,6 +145,23 @@ class FakeDiagnosticLog final : public DiagnosticLog {
     if (open_error) return {nullptr, *open_error};
     std::string& content = files[pathOf(place) + '/' + std::string(name)];
     return {std::make_unique<File>(*this, content), ""};
+  }
+  DiagnosticFile::Error putFile(std::string_view place, std::string_view name,
+                                std::string_view text) override {
+    for (const auto& error : {open_error, write_error, close_error}) {
+      if (error) return error;
+    }
+    files[pathOf(place) + '/' + std::string(name)] = text;
+    return std::nullopt;
+  }
+  void keepLast(std::string_view place, std::size_t most) override {
+    const std::string prefix = pathOf(place) + '/';
+    const auto first = files.lower_bound(prefix);
+    const auto is_there = [&prefix](const auto& file) { return file.first.starts_with(prefix); };
+    for (auto left = std::count_if(first, files.end(), is_there); left > static_cast<std::ptrdiff_t>(most);
+         --left) {
+      files.erase(files.lower_bound(prefix));
+    }
   }
 
   std::vector<std::string> directories;

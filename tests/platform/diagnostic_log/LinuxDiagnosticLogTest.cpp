@@ -5,6 +5,7 @@
 
 #include <csignal>
 #include <filesystem>
+#include <set>
 #include <string>
 #include <vector>
 
@@ -17,8 +18,35 @@ namespace {
 namespace fs = std::filesystem;
 using ::testing::ElementsAre;
 
+/// A limit on the size of files stands in for a full disk.
+class SmallFiles {
+ public:
+  SmallFiles() : handler_(std::signal(SIGXFSZ, SIG_IGN)) {
+    getrlimit(RLIMIT_FSIZE, &before_);
+    const rlimit tiny{.rlim_cur = 8, .rlim_max = before_.rlim_max};
+    setrlimit(RLIMIT_FSIZE, &tiny);
+  }
+  SmallFiles(const SmallFiles&) = delete;
+  SmallFiles& operator=(const SmallFiles&) = delete;
+  ~SmallFiles() {
+    setrlimit(RLIMIT_FSIZE, &before_);
+    std::signal(SIGXFSZ, handler_);
+  }
+
+ private:
+  rlimit before_{};
+  void (*handler_)(int);
+};
+
 class DiagnosticLogOnDisk : public ::testing::Test {
  protected:
+  std::set<std::string> names(const char* place) const {
+    std::set<std::string> found;
+    for (const auto& entry : fs::directory_iterator(root.path() / place))
+      found.insert(entry.path().filename().string());
+    return found;
+  }
+
   test::TemporaryDirectory root;
   LinuxDiagnosticLog log{root.path()};
 };
@@ -73,7 +101,6 @@ TEST_F(DiagnosticLogOnDisk, MissingLogIsAnErrorAndNoMore) {
   EXPECT_FALSE(missing.createFile("Audio", "report.json").error.empty());
 }
 
-// A limit on the size of files stands in for a full disk.
 TEST_F(DiagnosticLogOnDisk, DiskThatIsFullIsToldOfOnce) {
   ASSERT_EQ(log.makeDirectory("Audio"), std::nullopt);
   std::vector<DiagnosticFile::Error> errors;  // of each write, then of the closing
@@ -81,21 +108,40 @@ TEST_F(DiagnosticLogOnDisk, DiskThatIsFullIsToldOfOnce) {
     errors.clear();
     auto opened = log.createFile("Audio", name);
     ASSERT_TRUE(opened.file);
-    rlimit before{};
-    getrlimit(RLIMIT_FSIZE, &before);
-    const rlimit tiny{.rlim_cur = 8, .rlim_max = before.rlim_max};
-    const auto handler = std::signal(SIGXFSZ, SIG_IGN);
-    setrlimit(RLIMIT_FSIZE, &tiny);
+    const SmallFiles only;
     for (const std::size_t size : sizes) errors.push_back(opened.file->write(std::string(size, 'x')));
     errors.push_back(opened.file->close());
-    setrlimit(RLIMIT_FSIZE, &before);
-    std::signal(SIGXFSZ, handler);
   };
   const DiagnosticFile::Error none;
   writeToFullDisk("small", {30});  // waits in memory
   EXPECT_THAT(errors, ElementsAre(none, "File too large"));
   writeToFullDisk("large", {200'000, 200'000, 7, 300'000, 7});
   EXPECT_THAT(errors, ElementsAre(none, "File too large", none, none, none, none));
+}
+
+TEST_F(DiagnosticLogOnDisk, AFileAppearsWholeOrNotAtAll) {
+  ASSERT_EQ(log.makeDirectory("Audio"), std::nullopt);
+  const std::string text(300'000, 'x');
+  EXPECT_EQ(log.putFile("Audio", "report.md", text), std::nullopt);
+  EXPECT_EQ(test::readFile(root.path() / "Audio/report.md"), text);
+  {
+    const SmallFiles only;
+    EXPECT_EQ(log.putFile("Audio", "later.md", "does not fit"), "File too large");
+  }
+  EXPECT_NE(log.putFile("elsewhere", "report.md", text), std::nullopt);
+  EXPECT_THAT(names("Audio"), ElementsAre("report.md"));
+}
+
+TEST_F(DiagnosticLogOnDisk, OnlyTheLastFilesAreKept) {
+  ASSERT_EQ(log.makeDirectory("Audio/20230101"), std::nullopt);
+  fs::create_symlink(root.path() / "precious", root.path() / "Audio/20230102");
+  for (const char* name : {"20240103", "20240101", ".unfinished-20240104", "20240102"}) {
+    test::writeFile(root.path() / "Audio" / name, "");
+  }
+  log.keepLast("Audio", 4);
+  EXPECT_EQ(names("Audio").size(), 6U);
+  log.keepLast("Audio", 2);
+  EXPECT_THAT(names("Audio"), ElementsAre("20230101", "20230102", "20240102", "20240103"));
 }
 
 }  // namespace

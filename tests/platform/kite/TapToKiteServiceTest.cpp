@@ -102,6 +102,17 @@ TEST_F(TapToKiteService, ADiskThatFailsIsToldAndTheDesktopIsNot) {
   EXPECT_THAT(shown, ElementsAre());
 }
 
+TEST_F(TapToKiteService, ANewDraftTakesThePlaceOfTheOldest) {
+  for (std::size_t i = 0; i < kMostDrafts; ++i) {
+    const std::string name = "/log/Audio/Drafts/20230131-" + std::to_string(100000 + i);
+    files.files[name + ".json"] = files.files[name + ".md"] = "older";
+  }
+  EXPECT_EQ(create(), std::nullopt);
+  EXPECT_EQ(files.files.size(), 2 * kMostDrafts);
+  EXPECT_EQ(files.files.begin()->first, "/log/Audio/Drafts/20230131-100001.json");
+  EXPECT_NE(files.files.rbegin()->second, "older");
+}
+
 TEST_F(TapToKiteService, ADraftIsMadeWhereThereIsNoDesktop) {
   desktop_error = "no session bus";
   EXPECT_EQ(create(), std::nullopt);

@@ -18,6 +18,9 @@ class LinuxDiagnosticLog final : public DiagnosticLog {
   DiagnosticFile::Error makeDirectory(std::string_view place) override;
   /// The file can be read by all, written by the daemon's user alone.
   Opened createFile(std::string_view place, std::string_view name) override;
+  DiagnosticFile::Error putFile(std::string_view place, std::string_view name,
+                                std::string_view text) override;
+  void keepLast(std::string_view place, std::size_t most) override;
 
  private:
   const std::filesystem::path root_;

@@ -63,15 +63,16 @@ void LinuxTapToKiteService::createDraft(KiteDraft draft, std::optional<std::stri
 
 std::optional<std::string> LinuxTapToKiteService::write(const KiteReport& report) {
   if (auto error = dependencies_.diagnostic_log.makeDirectory(kDraftsPlace)) return error;
+  // Room for the two files to come.
+  dependencies_.diagnostic_log.keepLast(kDraftsPlace, 2 * (kMostDrafts - 1));
   if (auto error = writeFile(report.name + ".md", kiteReportAsMarkdown(report))) return error;
   return writeFile(report.name + ".json", kiteReportAsJson(report));
 }
 
 std::optional<std::string> LinuxTapToKiteService::writeFile(const std::string& name, std::string_view text) {
-  const auto [file, not_opened] = dependencies_.diagnostic_log.createFile(kDraftsPlace, name);
-  auto error = file ? file->write(text) : std::optional(not_opened);
-  if (file && !error) error = file->close();
-  if (error) return name + ": " + *error;
+  if (auto error = dependencies_.diagnostic_log.putFile(kDraftsPlace, name, text)) {
+    return name + ": " + *error;
+  }
   return std::nullopt;
 }
 

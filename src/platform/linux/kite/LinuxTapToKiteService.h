@@ -3,6 +3,7 @@
 // Drafts of bug reports as files of the diagnostic-log directory, announced on
 // the desktop.
 
+#include <cstddef>
 #include <functional>
 #include <optional>
 #include <string>
@@ -20,6 +21,8 @@ namespace tal {
 
 /// Where the drafts go, below the diagnostic-log directory.
 inline constexpr std::string_view kDraftsPlace = "Audio/Drafts";
+/// So many are kept; then a new one takes the place of the oldest.
+inline constexpr std::size_t kMostDrafts = 50;
 
 /// Writes `<time>-<id>.md` and `<time>-<id>.json`, the latter last, and tells the
 /// desktop. Any thread; disk and bus are waited for on a thread of its own. The
