@@ -29,6 +29,7 @@ std::string messagesFile(const SymptomContext& context) {
   std::vector<std::string> lines;  // the newest first
   std::size_t bytes = 0;
   const auto& messages = context.last_messages;
+  // Not every compiler can read the library's reversed ranges. NOLINTNEXTLINE(modernize-loop-convert)
   for (auto each = messages.rbegin(); each != messages.rend(); ++each) {
     lines.push_back(jsonLine({{"category", TalReportingUtilityCategoryString(each->category)},
                               {"type", TalReportingUtilityTypeString(each->type)},
@@ -40,6 +41,7 @@ std::string messagesFile(const SymptomContext& context) {
     }
   }
   std::string text;
+  // NOLINTNEXTLINE(modernize-loop-convert)
   for (auto line = lines.rbegin(); line != lines.rend(); ++line) text += *line;
   return text;
 }
